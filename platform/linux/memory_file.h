@@ -1,0 +1,23 @@
+#pragma once
+
+#include "platform/linux/file_descriptor.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <span>
+#include <vector>
+
+namespace typhon {
+
+/// A sealed memory file with these bytes, or none when the system has no memory files or no room.
+FileDescriptor sealedMemoryFile(std::span<const std::uint8_t> bytes);
+
+/// Another open description of the same memory file, read-only and with an offset of its own.
+FileDescriptor reopenedReadOnly(int memoryFile);
+
+/// The contents of a memory file received from somebody else, or null when it is not one, is not sealed
+/// against writing and resizing, or is larger than `limit`.
+std::optional<std::vector<std::uint8_t>> contentsOfSealedMemoryFile(int descriptor, std::size_t limit);
+
+}  // namespace typhon

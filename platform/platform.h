@@ -1,0 +1,60 @@
+#pragma once
+
+#include "platform/application_registry.h"
+#include "platform/clock.h"
+#include "platform/code_signing.h"
+#include "platform/file_system.h"
+#include "platform/ipc.h"
+#include "platform/log.h"
+#include "platform/preferences.h"
+#include "platform/sandbox.h"
+#include "platform/user_font_manager.h"
+#include "platform/work_queues.h"
+
+#include <map>
+#include <memory>
+#include <mutex>
+#include <string>
+
+namespace typhon {
+
+/// Serial queues that belong to the process rather than to one daemon object, each created on first use
+/// and kept. Any thread.
+class ProcessWideQueues {
+public:
+    explicit ProcessWideQueues(WorkQueues& queues) : queues_(queues) {}
+
+    WorkQueue& serialQueue(const std::string& label)
+    {
+        const std::lock_guard lock(mutex_);
+        auto& queue = byLabel_[label];
+        if (!queue) {
+            queue = queues_.createSerialQueue(label);
+        }
+        return *queue;
+    }
+
+private:
+    WorkQueues& queues_;
+    std::mutex mutex_;
+    std::map<std::string, std::shared_ptr<WorkQueue>> byLabel_;
+};
+
+/// Every service the daemon stands on, and what is process-wide. Built by `main` (or by a test), which
+/// keeps the services alive for as long as anything uses them.
+struct Platform {
+    WorkQueues& queues;
+    Clock& clock;
+    Ipc& ipc;
+    CodeSigning& codeSigning;
+    Sandbox& sandbox;
+    Preferences& preferences;
+    FileSystem& fileSystem;
+    Log& log;
+    ApplicationRegistry& applicationRegistry;
+    TYUserFontManager& userFontManager;
+
+    ProcessWideQueues processWideQueues{queues};
+};
+
+}  // namespace typhon
