@@ -1,0 +1,119 @@
+#include "platform/linux/exec_generation.h"
+
+#include "platform/linux/file_descriptor.h"
+
+#include <array>
+#include <charconv>
+#include <cstring>
+#include <string_view>
+
+#include <elf.h>
+#include <fcntl.h>
+#include <sodium.h>
+#include <unistd.h>
+
+// An exec leaves the process identifier, the pidfd and the start time as they are. What it renews is the
+// auxiliary vector (addresses under randomisation) and the 16 random bytes that AT_RANDOM points to. Both go
+// into the value: some language run-times wipe the random bytes once they have used them, and the vector is
+// the kernel's copy, which a stray write into the program's own memory does not reach.
+
+namespace typhon {
+
+namespace {
+
+constexpr std::size_t randomLength = 16;
+
+/// Reads up to the whole buffer from the start of a file; the number of bytes read.
+std::size_t readFile(int directory, const char* name, char* buffer, std::size_t size)
+{
+    const FileDescriptor file(::openat(directory, name, O_RDONLY | O_CLOEXEC));
+    std::size_t length = 0;
+    while (file && length < size) {
+        const auto count = ::read(file.get(), buffer + length, size - length);
+        if (count <= 0) {
+            break;
+        }
+        length += static_cast<std::size_t>(count);
+    }
+    return length;
+}
+
+/// The address under AT_RANDOM in a vector of (type, value) pairs of `Word`, or 0.
+template <class Word>
+std::uint64_t randomAddress(const char* vector, std::size_t length)
+{
+    for (std::size_t at = 0; at + 2 * sizeof(Word) <= length; at += 2 * sizeof(Word)) {
+        std::array<Word, 2> entry;
+        std::memcpy(entry.data(), vector + at, sizeof entry);
+        if (entry[0] == AT_NULL) {
+            break;
+        }
+        if (entry[0] == AT_RANDOM) {
+            return entry[1];
+        }
+    }
+    return 0;
+}
+
+std::uint64_t hashOf(const unsigned char* bytes, std::size_t length)
+{
+    std::array<unsigned char, crypto_generichash_BYTES_MIN> digest;
+    crypto_generichash(digest.data(), digest.size(), bytes, length, nullptr, 0);
+    std::uint64_t value = 0;
+    std::memcpy(&value, digest.data(), sizeof value);
+    return value;
+}
+
+}  // namespace
+
+std::uint64_t execGeneration(int processDirectory)
+{
+    std::array<char, 1024 + randomLength> bytes;
+    const auto length = readFile(processDirectory, "auxv", bytes.data(), bytes.size() - randomLength);
+    auto address = randomAddress<std::uint64_t>(bytes.data(), length);
+    if (address == 0) {
+        address = randomAddress<std::uint32_t>(bytes.data(), length);
+    }
+    const FileDescriptor memory(::openat(processDirectory, "mem", O_RDONLY | O_CLOEXEC));
+    if (address == 0 || ::pread(memory.get(), bytes.data() + length, randomLength,
+                                static_cast<off_t>(address)) != static_cast<ssize_t>(randomLength)) {
+        return 0;
+    }
+    const auto value = hashOf(reinterpret_cast<const unsigned char*>(bytes.data()), length + randomLength);
+    sodium_memzero(bytes.data(), bytes.size());
+    return value == 0 ? 1 : value;
+}
+
+std::optional<std::uint64_t> startTime(int processDirectory)
+{
+    std::array<char, 1024> buffer;
+    const std::string_view text(buffer.data(),
+                                readFile(processDirectory, "stat", buffer.data(), buffer.size()));
+    // The second field is the program's name in brackets, which may hold anything; the start time is the
+    // twentieth field after it.
+    auto at = text.rfind(')');
+    for (int field = 0; field < 20 && at != std::string_view::npos; ++field) {
+        at = text.find(' ', at + 1);
+    }
+    std::uint64_t value = 0;
+    if (at == std::string_view::npos ||
+        std::from_chars(text.data() + at + 1, text.data() + text.size(), value).ec != std::errc{}) {
+        return std::nullopt;
+    }
+    return value;
+}
+
+std::uint32_t bootEpoch()
+{
+    static const std::uint32_t epoch = [] {
+        std::array<char, 64> buffer;
+        const auto length =
+            readFile(AT_FDCWD, "/proc/sys/kernel/random/boot_id", buffer.data(), buffer.size());
+        const auto value =
+            static_cast<std::uint32_t>(hashOf(reinterpret_cast<const unsigned char*>(buffer.data()), length));
+        return value == 0 ? 1u : value;
+    }();
+    return epoch;
+}
+
+}  // namespace typhon
