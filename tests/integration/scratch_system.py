@@ -1,0 +1,223 @@
+"""A whole typhond system in a scratch folder: keys, signatures, fonts, preferences and the running daemon."""
+
+import contextlib
+import json
+import os
+import pathlib
+import plistlib
+import shutil
+import signal
+import socket
+import subprocess
+import tempfile
+import threading
+import time
+
+BIN = pathlib.Path(os.environ["TYPHON_BIN_DIR"])
+ENTITLEMENT = "com.vorlan.developer.user-fonts"
+FONT_FILES = "/var/mobile/Library/UserFonts/FontFiles"
+FONT_ASSETS = "/var/mobile/Library/UserFonts/FontAssets"
+ASSET_STORE = "/private/var/Cargon/AssetsV2/com_vorlan_Cargon_Font7"
+REGISTRY = "/var/mobile/Library/UserFonts/UserFonts.plist"
+PREFERENCES = "/var/mobile/Library/Preferences/com.vorlan.typhond.plist"
+SERVICE = "com.vorlan.typhond"
+PATIENCE = 60
+
+
+class Daemon:
+    """A running typhond and what it logs."""
+
+    def __init__(self, system, arguments=(), popen_options=None):
+        command = [BIN / "typhond", "--root", system.root, "--log-level", "debug", *arguments]
+        self.process = subprocess.Popen(
+            [str(part) for part in command], stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
+            stderr=subprocess.PIPE, text=True, errors="replace", **(popen_options or {}))
+        self.lines = []
+        self._changed = threading.Condition()
+        self._reader = threading.Thread(target=self._read, daemon=True)
+        self._reader.start()
+
+    def _read(self):
+        for line in self.process.stderr:
+            with self._changed:
+                self.lines.append(line.rstrip("\n"))
+                self._changed.notify_all()
+        with self._changed:
+            self._changed.notify_all()
+
+    def wait_for_line(self, text):
+        """The first log line that contains `text`; fails when it does not come."""
+        def found():
+            return next((line for line in self.lines if text in line), None)
+        with self._changed:
+            self._changed.wait_for(found, PATIENCE)
+            line = found()
+        if line is None:
+            raise AssertionError(f"not logged: {text!r}; logged: {self.lines[-20:]}")
+        return line
+
+    def lines_with(self, text):
+        with self._changed:
+            return [line for line in self.lines if text in line]
+
+    def kill(self, number=signal.SIGKILL):
+        if self.process.poll() is None:
+            self.process.send_signal(number)
+        self.process.wait(PATIENCE)
+        self._reader.join(PATIENCE)
+        self.process.stderr.close()
+
+
+class ScratchSystem:
+    """Everything lies under `root`, a scratch folder that `close` removes, daemon and all."""
+
+    def __init__(self):
+        self.folder = pathlib.Path(tempfile.mkdtemp(prefix="typhon-test-"))
+        self.root = self.folder / "root"
+        self.daemon = None
+        for directory in (FONT_FILES, FONT_ASSETS, ASSET_STORE, "/var/mobile/Library/Preferences"):
+            self.real(directory).mkdir(parents=True)
+        self._serial = 0
+        self._keys = {}
+
+    def close(self):
+        self.stop()
+        shutil.rmtree(self.folder, ignore_errors=True)
+
+    def __enter__(self):
+        return self
+
+    def __exit__(self, *exception):
+        self.close()
+
+    def real(self, logical):
+        return pathlib.Path(f"{self.root}{logical}")
+
+    # -- commands
+
+    def ctl(self, *arguments, check=True, program=None, **options):
+        """Runs typhonctl (or a copy of it) against this system."""
+        command = [program or BIN / "typhonctl", "--root", self.root, *arguments]
+        options.setdefault("timeout", PATIENCE)
+        options.setdefault("stdin", subprocess.DEVNULL)
+        done = subprocess.run([str(part) for part in command], capture_output=True, **options)
+        if check and done.returncode != 0:
+            raise AssertionError(f"{command}: exit {done.returncode}: {done.stderr.decode(errors='replace')}")
+        return done
+
+    def checkin(self, program, sandboxed=False, **options):
+        """What a copy of typhonctl sees when it checks in: a dictionary, or None."""
+        launcher = []
+        if sandboxed:
+            launcher = [BIN / "typhonctl", "--root", self.root, "run", "--"]
+        command = [*launcher, program, "--root", self.root, "--json", "checkin"]
+        done = subprocess.run([str(part) for part in command], capture_output=True, timeout=PATIENCE,
+                              stdin=subprocess.DEVNULL, **options)
+        if done.returncode != 0:
+            raise AssertionError(f"{command}: exit {done.returncode}: {done.stderr.decode(errors='replace')}")
+        return json.loads(done.stdout)
+
+    # -- keys and programs
+
+    def key(self, name="vendor", trust=()):
+        """A key pair, trusted with the given options of `typhonctl trust` (None: not trusted)."""
+        if name not in self._keys:
+            path = self.folder / f"{name}.key"
+            self.ctl("keygen", "--key", path)
+            if trust is not None:
+                self.ctl("trust", *trust, f"{path}.pub")
+            self._keys[name] = path
+        return self._keys[name]
+
+    def program(self, identifier=None, capabilities=None, key=None, entitlements=None):
+        """A copy of typhonctl of its own content, signed for `identifier` (None: not signed)."""
+        self._serial += 1
+        path = self.folder / f"program{self._serial}"
+        shutil.copy(BIN / "typhonctl", path)
+        with path.open("ab") as file:
+            file.write(f"\nprogram {self._serial} of {self.folder}".encode())
+        if identifier is not None:
+            self.sign(path, identifier, capabilities, key, entitlements)
+        return path
+
+    def sign(self, path, identifier, capabilities=None, key=None, entitlements=None, check=True):
+        if entitlements is None:
+            entitlements = {} if capabilities is None else {ENTITLEMENT: capabilities}
+        document = self.folder / "entitlements.plist"
+        document.write_bytes(plistlib.dumps(entitlements))
+        if key is None:
+            platform = identifier.startswith("com.vorlan.")
+            key = self.key("platform", ["--platform"]) if platform else self.key()
+        return self.ctl("sign", "--key", key, "--identifier", identifier, "--entitlements", document, path,
+                        check=check)
+
+    # -- registry and preferences
+
+    def write_registry(self, registry, format=plistlib.FMT_BINARY):
+        path = self.real(REGISTRY)
+        if isinstance(registry, bytes):
+            path.write_bytes(registry)
+        else:
+            path.write_bytes(plistlib.dumps(registry, fmt=format))
+
+    def font_file(self, directory, name, content=None, tree=FONT_FILES):
+        """Puts a file into a font tree; gives its logical path."""
+        logical = f"{tree}/{directory}/{name}"
+        path = self.real(logical)
+        path.parent.mkdir(parents=True, exist_ok=True)
+        path.write_bytes(content if content is not None else f"font {name} of {directory}".encode())
+        return logical
+
+    def write_preferences(self, preferences):
+        self.real(PREFERENCES).write_bytes(plistlib.dumps(preferences, fmt=plistlib.FMT_BINARY))
+
+    def preferences(self):
+        path = self.real(PREFERENCES)
+        return plistlib.loads(path.read_bytes()) if path.exists() else {}
+
+    # -- the daemon
+
+    def socket_path(self, service=SERVICE):
+        return self.real(f"/run/typhon/{service}")
+
+    def start(self, *arguments, **popen_options):
+        self.daemon = Daemon(self, arguments, popen_options)
+        for service in (SERVICE, f"{SERVICE}.file-access", f"{SERVICE}.sandboxes"):
+            self._wait_for_socket(self.socket_path(service))
+        return self.daemon
+
+    def _wait_for_socket(self, path):
+        deadline = time.monotonic() + PATIENCE
+        while time.monotonic() < deadline:
+            if self.daemon.process.poll() is not None:
+                raise AssertionError(f"typhond ended: {self.daemon.lines}")
+            with contextlib.closing(socket.socket(socket.AF_UNIX)) as probe:
+                try:
+                    probe.connect(str(path))
+                    return
+                except OSError:
+                    time.sleep(0.01)
+        raise AssertionError(f"no socket {path}: {self.daemon.lines}")
+
+    def stop(self):
+        if self.daemon is not None:
+            self.daemon.kill()
+            self.daemon = None
+
+    def restart(self, *arguments):
+        self.stop()
+        return self.start(*arguments)
+
+
+def eventually(condition):
+    """Waits until the condition holds; fails when it never does."""
+    deadline = time.monotonic() + PATIENCE
+    while not condition():
+        if time.monotonic() > deadline:
+            raise AssertionError("it never came to pass")
+        time.sleep(0.01)
+
+
+def entry(postscript, family, disabled=False, **more):
+    """A registry entry of a file with one face."""
+    return {"familyName": {postscript: family}, "disabled": disabled, **more}
