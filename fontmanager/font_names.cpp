@@ -1,0 +1,147 @@
+#include "fontmanager/font_names.h"
+
+#include "fontmanager/name_records.h"
+
+#include <array>
+#include <cerrno>
+#include <memory>
+#include <utility>
+
+#include <ft2build.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include FT_FREETYPE_H
+
+// Font files come from anybody, and FreeType reads many formats. Only the two that applications install are
+// let through to it, told by their first four bytes, and it reads the file a piece at a time: a mapped file
+// that somebody shortens would kill the process.
+
+namespace typhon {
+
+namespace {
+
+struct LibraryDeleter {
+    void operator()(FT_Library library) const { FT_Done_FreeType(library); }
+};
+struct FaceDeleter {
+    void operator()(FT_Face face) const { FT_Done_Face(face); }
+};
+using Library = std::unique_ptr<FT_LibraryRec_, LibraryDeleter>;
+using Face = std::unique_ptr<FT_FaceRec_, FaceDeleter>;
+
+FontNamesReading failure(std::string error)
+{
+    return {.familyNames = std::nullopt, .error = std::move(error)};
+}
+
+std::size_t readAt(int descriptor, std::uint64_t offset, unsigned char* buffer, std::size_t count)
+{
+    std::size_t filled = 0;
+    while (filled < count) {
+        const auto part =
+            ::pread(descriptor, buffer + filled, count - filled, static_cast<off_t>(offset + filled));
+        if (part < 0 && errno == EINTR) {
+            continue;
+        }
+        if (part <= 0) {
+            break;
+        }
+        filled += static_cast<std::size_t>(part);
+    }
+    return filled;
+}
+
+/// As FreeType wants it: bytes read, or with a count of zero, whether seeking failed.
+unsigned long readForStream(FT_Stream stream, unsigned long offset, unsigned char* buffer,
+                            unsigned long count)
+{
+    if (count == 0) {
+        return offset > stream->size ? 1 : 0;
+    }
+    return readAt(static_cast<int>(stream->descriptor.value), offset, buffer, count);
+}
+
+bool isTrueTypeOrOpenType(int descriptor)
+{
+    std::array<unsigned char, 4> start{};
+    if (readAt(descriptor, 0, start.data(), start.size()) != start.size()) {
+        return false;
+    }
+    const std::string_view tag(reinterpret_cast<const char*>(start.data()), start.size());
+    return tag == std::string_view("\0\1\0\0", 4) || tag == "true" || tag == "OTTO" || tag == "ttcf";
+}
+
+/// A face of the font, or the font without any of its faces for index -1. `stream` outlives it.
+std::pair<Face, FT_Error> openFace(const Library& library, FT_StreamRec& stream, long index)
+{
+    FT_Open_Args arguments{};
+    arguments.flags = FT_OPEN_STREAM;
+    arguments.stream = &stream;
+    FT_Face face = nullptr;
+    const FT_Error error = FT_Open_Face(library.get(), &arguments, index, &face);
+    return {Face(error == 0 ? face : nullptr), error};
+}
+
+std::string whyUnreadable(FT_Error error)
+{
+    const char* text = FT_Error_String(error);
+    return "the font cannot be read: " +
+           (text != nullptr ? std::string(text) : "FreeType error " + std::to_string(error));
+}
+
+FontNamesReading readFaces(const Library& library, FT_StreamRec& stream, const FontLimits& limits)
+{
+    const auto [font, error] = openFace(library, stream, -1);
+    if (!font) {
+        return failure(whyUnreadable(error));
+    }
+    const long count = font->num_faces;
+    if (count < 1 || count > limits.faces) {
+        return failure("the font has " + std::to_string(count) + " faces; 1 to " +
+                       std::to_string(limits.faces) + " are accepted");
+    }
+    std::map<std::string, std::string> names;
+    for (long index = 0; index < count; ++index) {
+        const auto [face, faceError] = openFace(library, stream, index);
+        if (!face) {
+            return failure("face " + std::to_string(index) + ": " + whyUnreadable(faceError));
+        }
+        auto postScript = postScriptNameOf(face.get(), limits.nameBytes);
+        auto family = familyNameOf(face.get(), limits.nameBytes);
+        if (!postScript || !family) {
+            return failure("face " + std::to_string(index) + " has no usable " +
+                           (postScript ? "family" : "PostScript") + " name");
+        }
+        names.insert_or_assign(std::move(*postScript), std::move(*family));
+    }
+    return {.familyNames = std::move(names), .error = {}};
+}
+
+}  // namespace
+
+FontNamesReading readFontNames(int descriptor, const FontLimits& limits)
+{
+    struct stat status {};
+    if (::fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode)) {
+        return failure("not a regular file");
+    }
+    if (static_cast<std::uint64_t>(status.st_size) > limits.bytes) {
+        return failure("larger than " + std::to_string(limits.bytes) + " bytes");
+    }
+    if (!isTrueTypeOrOpenType(descriptor)) {
+        return failure("not a TrueType or OpenType font");
+    }
+    FT_Library opened = nullptr;
+    if (const FT_Error error = FT_Init_FreeType(&opened)) {
+        return failure(whyUnreadable(error));
+    }
+    const Library library(opened);
+    FT_StreamRec stream{};
+    stream.size = static_cast<unsigned long>(status.st_size);
+    stream.descriptor.value = descriptor;
+    stream.read = readForStream;
+    return readFaces(library, stream, limits);
+}
+
+}  // namespace typhon

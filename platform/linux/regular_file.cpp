@@ -1,0 +1,87 @@
+#include "platform/linux/regular_file.h"
+
+#include <cerrno>
+#include <system_error>
+
+#include <linux/openat2.h>
+#include <sys/syscall.h>
+
+namespace typhon {
+
+namespace {
+
+int openAsPath(int directory, const std::string& path, std::uint64_t resolve)
+{
+    if (resolve == 0) {
+        return ::openat(directory, path.c_str(), O_PATH | O_CLOEXEC);
+    }
+    open_how how{};
+    how.flags = O_PATH | O_CLOEXEC;
+    how.resolve = resolve;
+    return static_cast<int>(::syscall(SYS_openat2, directory, path.c_str(), &how, sizeof how));
+}
+
+}  // namespace
+
+FileIdentity::FileIdentity(const struct stat& status)
+    : device(status.st_dev), inode(status.st_ino), changeSeconds(status.st_ctim.tv_sec),
+      changeNanoseconds(status.st_ctim.tv_nsec), size(status.st_size)
+{}
+
+OpenedFile openRegularFile(const std::string& path, int directory, std::uint64_t resolve)
+{
+    OpenedFile opened;
+    // First without opening it really: opening a pipe can block and opening a device can have effects.
+    const FileDescriptor found(openAsPath(directory, path, resolve));
+    if (!found || ::fstat(found.get(), &opened.status) != 0) {
+        opened.error = errno;
+        return opened;
+    }
+    if (!S_ISREG(opened.status.st_mode)) {
+        opened.error = S_ISDIR(opened.status.st_mode) ? EISDIR : EINVAL;
+        return opened;
+    }
+    const auto same = "/proc/self/fd/" + std::to_string(found.get());
+    opened.file = FileDescriptor(::open(same.c_str(), O_RDONLY | O_CLOEXEC));
+    opened.error = opened.file ? 0 : errno;
+    return opened;
+}
+
+FileContents readWhole(int descriptor, std::size_t limit)
+{
+    FileContents contents;
+    constexpr std::size_t block = 64 * 1024;
+    std::size_t filled = 0;
+    while (true) {
+        contents.bytes.resize(filled + block);
+        const auto count = ::read(descriptor, contents.bytes.data() + filled, block);
+        if (count < 0 && errno == EINTR) {
+            continue;
+        }
+        if (count < 0) {
+            contents.error = errno;
+        }
+        if (count <= 0) {
+            break;
+        }
+        filled += static_cast<std::size_t>(count);
+        if (filled > limit) {
+            contents.error = EFBIG;
+            break;
+        }
+    }
+    contents.bytes.resize(contents.error == 0 ? filled : 0);
+    return contents;
+}
+
+std::string OpenedFile::errorText() const
+{
+    return error == EINVAL ? "not a regular file" : typhon::errorText(error);
+}
+
+std::string errorText(int error)
+{
+    return std::generic_category().message(error);
+}
+
+}  // namespace typhon
