@@ -10,6 +10,8 @@
 
 namespace typhon {
 
+struct SimulatedMachine;
+
 /// The IPC transport of a simulated machine: several processes, each with its audit token, their named and
 /// anonymous listeners and the connections between them. Used directly it is the transport of the process
 /// under test (the daemon); `process` gives the transport as another process sees it. Messages are checked
@@ -42,10 +44,8 @@ public:
     std::size_t connectionCount() const;
 
 private:
-    class Machine;
-    class Process;
-    std::shared_ptr<Machine> machine_;
-    std::shared_ptr<Process> own_;
+    const std::shared_ptr<SimulatedMachine> machine_;
+    const std::shared_ptr<Ipc> own_;
 };
 
 }  // namespace typhon
