@@ -1,0 +1,37 @@
+#include "registry/entry_sharing.h"
+
+#include "registry/font_directories.h"
+#include "registry/registry_snapshot.h"
+
+namespace typhon {
+
+std::optional<PropertyList> issueExtensionData(Sandbox& sandbox, const AuditToken& token,
+                                               const std::string& path)
+{
+    const auto text = sandbox.issueReadExtension(token, path);
+    if (!text) {
+        return std::nullopt;
+    }
+    Data data{{text->begin(), text->end()}};
+    data.bytes.push_back(0);
+    return data;
+}
+
+void EntrySharing::add(const std::string& path, const PropertyList& entry, bool noGrant)
+{
+    if (isTrusted_ || noGrant || path.starts_with(font_directories::assetStore)) {
+        shared_.insert_or_assign(path, withoutDisabled(entry));
+        return;
+    }
+    // Intended: a confined client is not even told of a file that it can already read by itself.
+    if (sandbox_.mayRead(token_, path)) {
+        return;
+    }
+    auto shared = *withoutDisabled(entry).asDictionary();
+    if (auto data = issueExtensionData(sandbox_, token_, path)) {
+        shared.insert_or_assign("data", *std::move(data));
+    }
+    shared_.insert_or_assign(path, std::move(shared));
+}
+
+}  // namespace typhon
