@@ -1,0 +1,49 @@
+#pragma once
+
+#include "clients/typhon_handler.h"
+#include "platform/ipc.h"
+#include "platform/task.h"
+#include "protocol/wire.h"
+
+#include <memory>
+#include <span>
+
+namespace typhon {
+
+/// Who may use an operation. Others get `AccessDenied`, before anything else is looked at.
+enum class Admission { everyone, fontPicker };
+
+/// Whether an operation is served yet. Those to come answer `NotSupported`.
+enum class Availability { served, toCome };
+
+/// One row of the dispatch table.
+struct DispatchedOperation {
+    wire::Operation operation;
+    Admission admission;
+    Availability availability;
+    /// Decodes the arguments, calls the operation and encodes its reply. `object` outlives the task.
+    Task<void> (*handler)(TyphonDaemonProtocol& object, std::shared_ptr<IncomingCall> call);
+};
+
+/// Every operation that clients can call.
+std::span<const DispatchedOperation> dispatchTable();
+
+/// Handles a client's call as the table says, on the queue of the client's connection.
+Task<void> dispatch(std::shared_ptr<TyphonHandler> handler, std::shared_ptr<IncomingCall> call);
+
+/// What a client's connection exports: its handler, by way of the dispatch table.
+class ExportedHandler final : public ExportedObject {
+public:
+    explicit ExportedHandler(std::shared_ptr<TyphonHandler> handler) : handler_(std::move(handler)) {}
+
+    Task<void> handle(std::shared_ptr<IncomingCall> call) override
+    {
+        return dispatch(handler_, std::move(call));
+    }
+    const std::shared_ptr<TyphonHandler>& handler() const { return handler_; }
+
+private:
+    std::shared_ptr<TyphonHandler> handler_;
+};
+
+}  // namespace typhon
