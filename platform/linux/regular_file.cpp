@@ -1,7 +1,9 @@
 #include "platform/linux/regular_file.h"
 
 #include <cerrno>
+#include <ctime>
 #include <system_error>
+#include <utility>
 
 #include <linux/openat2.h>
 #include <sys/syscall.h>
@@ -27,6 +29,14 @@ FileIdentity::FileIdentity(const struct stat& status)
     : device(status.st_dev), inode(status.st_ino), changeSeconds(status.st_ctim.tv_sec),
       changeNanoseconds(status.st_ctim.tv_nsec), size(status.st_size)
 {}
+
+bool FileIdentity::isSettled() const
+{
+    timespec now{};
+    ::clock_gettime(CLOCK_REALTIME_COARSE, &now);
+    return std::pair(changeSeconds, changeNanoseconds) <
+           std::pair(std::int64_t(now.tv_sec), std::int64_t(now.tv_nsec));
+}
 
 OpenedFile openRegularFile(const std::string& path, int directory, std::uint64_t resolve)
 {

@@ -26,6 +26,11 @@ struct FileIdentity {
     FileIdentity() = default;
     explicit FileIdentity(const struct stat& status);
     auto operator<=>(const FileIdentity&) const = default;
+
+    /// True when every change from now on will show: the file's last change is earlier than the kernel's
+    /// clock for such times, which may stand still for some milliseconds. Asked before a reading, it says
+    /// whether that reading may be kept for as long as the identity stays.
+    bool isSettled() const;
 };
 
 /// An open regular file, or why there is none.

@@ -1,0 +1,35 @@
+#pragma once
+
+#include "platform/linux/file_descriptor.h"
+#include "platform/linux/regular_file.h"
+#include "platform/linux/root_directory.h"
+
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace typhon {
+
+/// A folder whose `applications` and `metainfo` describe installed applications.
+struct DataDirectory {
+    /// Real path of a folder that the administrator answers for: the data directory, or a user's home.
+    std::string base;
+    /// The data directory below `base`; empty when it is `base`.
+    std::string below;
+    /// True when a user fills it. Nothing in it may lead onto another file system, which that user might be
+    /// serving, and make a reader wait.
+    bool isUsers = false;
+
+    /// Opens a directory or a regular file of it. `path` is relative to the data directory.
+    FileDescriptor openDirectory(const std::string& path) const;
+    OpenedFile openFile(const std::string& path) const;
+};
+
+/// All data directories: those of the system first, in the order in which they are asked, then those of the
+/// users with a home directory. Under a scratch root, homes are the folders in its /home.
+std::vector<DataDirectory> dataDirectories(const RootDirectory& root);
+
+/// Changes when the set of users does.
+std::optional<FileIdentity> identityOfUserDatabase(const RootDirectory& root);
+
+}  // namespace typhon

@@ -1,0 +1,66 @@
+#pragma once
+
+#include "platform/linux/appstream_metadata.h"
+#include "platform/linux/data_directories.h"
+#include "platform/linux/desktop_entry.h"
+#include "platform/linux/directory_listing.h"
+#include "platform/linux/regular_file.h"
+
+#include <cstdint>
+#include <map>
+#include <optional>
+#include <string>
+#include <utility>
+
+namespace typhon {
+
+/// The applications that one data directory describes. Names are taken from complete scans, contents from
+/// the files as they stand when asked for. Not thread-safe.
+class InstalledApplications {
+public:
+    explicit InstalledApplications(DataDirectory where) : where_(std::move(where)) {}
+
+    /// Scans the directory if something was added, removed or renamed since. Null, or what is wrong with it:
+    /// too much is left out; and where a scan was not possible, the one before stands.
+    std::optional<std::string> refresh();
+
+    /// The desktop entry of the application; null when it is not installed here.
+    std::optional<DesktopEntry> entry(const std::string& bundleIdentifier) const;
+    /// The version that the application's metadata gives.
+    std::optional<std::string> version(const std::string& bundleIdentifier);
+
+private:
+    struct Metadata {
+        FileIdentity identity;
+        std::int64_t bytes = 0;
+        std::optional<AppStreamMetadata> contents;
+    };
+
+    /// What one scan saw.
+    struct Scan {
+        /// Every directory looked at, by path; null for one that is not there.
+        std::map<std::string, std::optional<FileIdentity>> directories;
+        bool isSettled = true;
+        /// Bundle identifier to desktop entry, and component identifier to metadata; as paths.
+        std::map<std::string, std::string> entries;
+        std::map<std::string, std::string> metadata;
+        /// What was left out.
+        std::optional<std::string> complaint;
+        /// False when the machine could not do it just now.
+        bool isComplete = true;
+    };
+
+    bool isCurrent() const;
+    DirectoryListing list(const std::string& path, Scan& scan) const;
+    void scanEntries(const std::string& path, const std::string& identifierPrefix, int depth,
+                     Scan& scan) const;
+    void scanMetadata(Scan& scan);
+    const Metadata& metadataIn(const std::string& path);
+
+    DataDirectory where_;
+    std::optional<Scan> scan_;
+    /// By path. Kept from scan to scan, so that only new files are parsed.
+    std::map<std::string, Metadata> metadata_;
+};
+
+}  // namespace typhon

@@ -1,0 +1,28 @@
+#pragma once
+
+#include "platform/file_system.h"
+#include "platform/linux/root_directory.h"
+
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+namespace typhon {
+
+/// The files of this machine. Symbolic links are followed; only regular files are ever opened.
+class LinuxFileSystem final : public FileSystem {
+public:
+    explicit LinuxFileSystem(RootDirectory root) : root_(std::move(root)) {}
+
+    bool exists(const std::string& path) override;
+    PropertyListReading readPropertyList(const std::string& path) override;
+    std::optional<std::vector<std::string>> contentsOfDirectory(const std::string& path) override;
+
+private:
+    std::optional<std::string> realPath(const std::string& path) const;
+
+    const RootDirectory root_;
+};
+
+}  // namespace typhon
