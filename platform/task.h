@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <coroutine>
 #include <exception>
 #include <optional>
@@ -12,20 +13,26 @@ class Task;
 
 namespace detail {
 
-/// Hands control back to whoever awaited the finished task.
+/// Hands control back to whoever awaited the finished task, if the awaiter has really gone to sleep.
 struct ContinueAwaiter {
     bool await_ready() const noexcept { return false; }
     template <class Promise>
-    std::coroutine_handle<> await_suspend(std::coroutine_handle<Promise> finished) const noexcept
+    void await_suspend(std::coroutine_handle<Promise> finished) const noexcept
     {
-        return finished.promise().continuation;
+        if (finished.promise().met.exchange(true)) {
+            finished.promise().continuation.resume();
+        }
     }
     void await_resume() const noexcept {}
 };
 
 struct TaskPromiseBase {
-    std::coroutine_handle<> continuation = std::noop_coroutine();
+    std::coroutine_handle<> continuation;
     std::exception_ptr exception;
+    /// Set by the first to arrive of the task's end and its awaiter's suspension; the second one continues
+    /// the awaiter. Transferring control between coroutines instead would need tail calls, which the
+    /// compiler makes at -O2 only: elsewhere a loop of tasks that never suspend would eat the stack.
+    std::atomic<bool> met{false};
 
     std::suspend_always initial_suspend() const noexcept { return {}; }
     ContinueAwaiter final_suspend() const noexcept { return {}; }
@@ -95,10 +102,12 @@ public:
         struct Awaiter {
             std::coroutine_handle<promise_type> handle;
             bool await_ready() const noexcept { return false; }
-            std::coroutine_handle<> await_suspend(std::coroutine_handle<> awaiting) const noexcept
+            bool await_suspend(std::coroutine_handle<> awaiting) const
             {
-                handle.promise().continuation = awaiting;
-                return handle;
+                detail::TaskPromiseBase& promise = handle.promise();
+                promise.continuation = awaiting;
+                handle.resume();
+                return !promise.met.exchange(true);
             }
             T await_resume() const { return handle.promise().take(); }
         };
