@@ -19,15 +19,6 @@ namespace typhon {
 
 namespace {
 
-std::optional<NamespaceIdentity> namespaceOf(int processDirectory, const char* link)
-{
-    struct stat status;
-    if (::fstatat(processDirectory, link, &status, 0) != 0) {
-        return std::nullopt;
-    }
-    return NamespaceIdentity{status.st_dev, status.st_ino};
-}
-
 /// Under `--ro-bind / /` the root is the same directory on another mount, so the mount counts.
 std::optional<std::array<std::uint64_t, 3>> rootOf(int processDirectory)
 {
@@ -67,15 +58,10 @@ std::string_view statusLine(std::string_view status, std::string_view name)
 
 }  // namespace
 
-std::optional<NamespaceIdentity> processNamespaceOf(int processDirectory)
-{
-    return namespaceOf(processDirectory, "ns/pid");
-}
-
 ConfinementProbe::View ConfinementProbe::viewOf(int directory)
 {
-    return {namespaceOf(directory, "ns/mnt"), namespaceOf(directory, "ns/user"),
-            processNamespaceOf(directory), rootOf(directory)};
+    return {inodeAt(directory, "ns/mnt"), inodeAt(directory, "ns/user"), inodeAt(directory, "ns/pid"),
+            rootOf(directory)};
 }
 
 ConfinementProbe::ConfinementProbe()

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "platform/linux/inode.h"
 #include "platform/linux/process_inspection.h"
 
 #include <array>
@@ -7,13 +8,6 @@
 #include <optional>
 
 namespace typhon {
-
-/// A namespace, by the device and inode of its file.
-struct NamespaceIdentity {
-    std::uint64_t device = 0;
-    std::uint64_t inode = 0;
-    auto operator<=>(const NamespaceIdentity&) const = default;
-};
 
 /// What holds a process in.
 struct Confinement {
@@ -38,16 +32,16 @@ public:
     Confinement look(const ProcessInspection& process) const;
 
     /// The process namespace of the host.
-    const std::optional<NamespaceIdentity>& hostProcessNamespace() const { return host_.process; }
+    const std::optional<Inode>& hostProcessNamespace() const { return host_.process; }
     /// True when the host was taken from process 1.
     bool isComparedWithProcessOne() const { return isProcessOne_; }
 
 private:
     /// The namespaces and the root a process sees; members that cannot be read are null.
     struct View {
-        std::optional<NamespaceIdentity> mount;
-        std::optional<NamespaceIdentity> user;
-        std::optional<NamespaceIdentity> process;
+        std::optional<Inode> mount;
+        std::optional<Inode> user;
+        std::optional<Inode> process;
         /// Mount, device and inode of the root directory.
         std::optional<std::array<std::uint64_t, 3>> root;
         bool isWhole() const { return mount && user && process && root; }
@@ -59,8 +53,5 @@ private:
     bool isProcessOne_ = false;
     bool hasLabels_ = false;
 };
-
-/// The process namespace of a process, from its directory in /proc; null when it cannot be read.
-std::optional<NamespaceIdentity> processNamespaceOf(int processDirectory);
 
 }  // namespace typhon

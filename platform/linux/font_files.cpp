@@ -2,9 +2,8 @@
 
 #include "platform/linux/locked_mount.h"
 #include "platform/linux/memory_file.h"
-#include "platform/linux/signing.h"
+#include "platform/linux/regular_file.h"
 
-#include <algorithm>
 #include <cerrno>
 
 #include <fcntl.h>
@@ -45,17 +44,8 @@ FileDescriptor openBelow(int top, const std::string& relativePath)
 
 FileDescriptor copyOf(int file)
 {
-    struct stat status;
-    if (::fstat(file, &status) != 0 || static_cast<std::size_t>(status.st_size) > copyLimit) {
-        return {};
-    }
-    Bytes bytes(static_cast<std::size_t>(status.st_size));
-    std::size_t length = 0;
-    for (ssize_t count = 1; count > 0 && length < bytes.size(); length += static_cast<std::size_t>(count)) {
-        count = std::max<ssize_t>(::read(file, bytes.data() + length, bytes.size() - length), 0);
-    }
-    bytes.resize(length);
-    const auto memory = sealedMemoryFile(bytes);
+    const auto contents = readWhole(file, copyLimit);
+    const auto memory = contents.error == 0 ? sealedMemoryFile(contents.bytes) : FileDescriptor();
     return memory ? reopenedReadOnly(memory.get()) : FileDescriptor();
 }
 
@@ -63,7 +53,7 @@ FileDescriptor copyOf(int file)
 
 std::shared_ptr<const FontFiles::Mount> FontFiles::mountOf(const FontTree& tree, int directory)
 {
-    const auto identity = identityOfFile(directory, "");
+    const auto identity = inodeAt(directory, "");
     const std::lock_guard lock(mutex_);
     auto& known = mounts_[tree.path];
     if (!usesMounts_ || !identity || (known && known->tree == *identity)) {

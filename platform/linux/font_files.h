@@ -2,7 +2,7 @@
 
 #include "platform/linux/file_descriptor.h"
 #include "platform/linux/font_trees.h"
-#include "platform/linux/read_access.h"
+#include "platform/linux/inode.h"
 #include "platform/linux/root_directory.h"
 #include "platform/log.h"
 
@@ -37,7 +37,7 @@ public:
 
 private:
     struct Mount {
-        FileIdentity tree;
+        Inode tree;
         FileDescriptor descriptor;
     };
     std::shared_ptr<const Mount> mountOf(const FontTree& tree, int directory);

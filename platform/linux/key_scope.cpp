@@ -1,6 +1,7 @@
 #include "platform/linux/property_list_reader.h"
 #include "platform/linux/property_list_writer.h"
 #include "platform/linux/signing.h"
+#include "platform/linux/unicode.h"
 
 #include <algorithm>
 #include <string_view>
@@ -44,30 +45,13 @@ bool isValidSigningIdentifier(std::string_view text)
     if (text.empty() || text.size() > 255) {
         return false;
     }
-    for (std::size_t at = 0; at < text.size();) {
-        const auto first = static_cast<unsigned char>(text[at]);
-        const std::size_t length = first < 0x80   ? 1
-                                   : first < 0xC2 ? 0
-                                   : first < 0xE0 ? 2
-                                   : first < 0xF0 ? 3
-                                                  : 4;
-        if (length == 0 || first > 0xF4 || at + length > text.size() || first < 0x20 || first == 0x7F) {
+    while (!text.empty()) {
+        const auto character = firstCharacter(text);
+        const auto value = character.value.value_or(0);
+        if (value < 0x20 || (value >= 0x7F && value < 0xA0)) {
             return false;
         }
-        std::uint32_t code = length == 1 ? first : first & (0x7Fu >> length);
-        for (std::size_t next = 1; next < length; ++next) {
-            const auto byte = static_cast<unsigned char>(text[at + next]);
-            if ((byte & 0xC0) != 0x80) {
-                return false;
-            }
-            code = (code << 6) | (byte & 0x3F);
-        }
-        const bool isOverlong = (length == 3 && code < 0x800) || (length == 4 && code < 0x10000);
-        if (isOverlong || code > 0x10FFFF || (code >= 0xD800 && code <= 0xDFFF) ||
-            (code >= 0x80 && code < 0xA0)) {
-            return false;
-        }
-        at += length;
+        text.remove_prefix(character.length);
     }
     return true;
 }

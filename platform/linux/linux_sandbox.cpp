@@ -17,7 +17,7 @@ bool LinuxSandbox::isSandboxed(const AuditToken& token)
 
 std::optional<bool> LinuxSandbox::reaches(const ProcessInspection& process, const std::string& path)
 {
-    const auto ours = identityOfFile(AT_FDCWD, root_.real(path).c_str());
+    const auto ours = inodeAt(AT_FDCWD, root_.real(path).c_str());
     const FileDescriptor root(::openat(process.directory(), "root", O_PATH | O_DIRECTORY | O_CLOEXEC));
     const auto credentials = fileCredentialsOf(process, probe_.look(process).hasOwnUserNamespace);
     if (!ours || !root || !credentials) {

@@ -1,6 +1,6 @@
 #include "platform/linux/locked_mount.h"
 
-#include "platform/linux/read_access.h"
+#include "platform/linux/inode.h"
 
 #include <cstring>
 #include <string>
@@ -136,7 +136,7 @@ FileDescriptor lockedReadOnlyMount(int directory)
     auto mount = child > 0 ? receive(ours.get()) : FileDescriptor();
     ::waitpid(child, nullptr, 0);
     const bool isRight =
-        mount && isReadOnly(mount.get()) && identityOfFile(mount.get(), "") == identityOfFile(directory, "");
+        mount && isReadOnly(mount.get()) && inodeAt(mount.get(), "") == inodeAt(directory, "");
     return isRight ? std::move(mount) : FileDescriptor();
 }
 

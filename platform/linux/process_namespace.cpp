@@ -5,7 +5,6 @@
 #include <fcntl.h>
 #include <linux/nsfs.h>
 #include <sys/ioctl.h>
-#include <sys/stat.h>
 
 namespace typhon {
 
@@ -21,19 +20,10 @@ FileDescriptor openProcessNamespace(int processDirectory)
     return FileDescriptor(::openat(processDirectory, "ns/pid", O_RDONLY | O_CLOEXEC));
 }
 
-std::optional<NamespaceIdentity> identityOfNamespace(int namespaceDescriptor)
-{
-    struct stat status;
-    if (::fstat(namespaceDescriptor, &status) != 0) {
-        return std::nullopt;
-    }
-    return NamespaceIdentity{status.st_dev, status.st_ino};
-}
-
-bool walkOutwards(FileDescriptor at, const std::function<bool(const NamespaceIdentity&)>& visit)
+bool walkOutwards(FileDescriptor at, const std::function<bool(const Inode&)>& visit)
 {
     for (int level = 0; at && level <= maximumNesting; ++level) {
-        const auto identity = identityOfNamespace(at.get());
+        const auto identity = inodeAt(at.get(), "");
         if (!identity) {
             return false;
         }

@@ -1,25 +1,15 @@
 #include "platform/linux/read_access.h"
 
-#include <array>
+#include "platform/linux/file_descriptor.h"
 
 #include <fcntl.h>
 #include <linux/openat2.h>
-#include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
 namespace typhon {
 
-std::optional<FileIdentity> identityOfFile(int directory, const char* path)
-{
-    struct stat status;
-    if (::fstatat(directory, path, &status, *path == '\0' ? AT_EMPTY_PATH : 0) != 0) {
-        return std::nullopt;
-    }
-    return FileIdentity{status.st_dev, status.st_ino};
-}
-
-std::optional<FileIdentity> readableFile(int root, const std::string& path)
+std::optional<Inode> readableFile(int root, const std::string& path)
 {
     open_how how{};
     how.flags = O_PATH | O_CLOEXEC;
@@ -28,7 +18,7 @@ std::optional<FileIdentity> readableFile(int root, const std::string& path)
     if (!file || ::syscall(SYS_faccessat2, file.get(), "", R_OK, AT_EMPTY_PATH | AT_EACCESS) != 0) {
         return std::nullopt;
     }
-    return identityOfFile(file.get(), "");
+    return inodeAt(file.get(), "");
 }
 
 BorrowedCredentials::~BorrowedCredentials()

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "platform/linux/file_credentials.h"
-#include "platform/linux/file_descriptor.h"
+#include "platform/linux/inode.h"
 
 #include <condition_variable>
 #include <functional>
@@ -13,19 +13,9 @@
 
 namespace typhon {
 
-/// A file by device and inode.
-struct FileIdentity {
-    std::uint64_t device = 0;
-    std::uint64_t inode = 0;
-    auto operator<=>(const FileIdentity&) const = default;
-};
-
-/// Null when there is no such file.
-std::optional<FileIdentity> identityOfFile(int directory, const char* path);
-
 /// The file at an absolute path below `root`, as somebody whose root directory that is sees it, if the
 /// calling thread's credentials allow to reach and to read it.
-std::optional<FileIdentity> readableFile(int root, const std::string& path);
+std::optional<Inode> readableFile(int root, const std::string& path);
 
 /// Asks questions of the file system with the credentials of somebody else, on one thread of its own, which
 /// is started when it is first needed. Any thread may ask.

@@ -30,10 +30,10 @@ struct SandboxInstances::Instance {
 
 struct SandboxInstances::Table {
     std::mutex mutex;
-    std::map<NamespaceIdentity, std::unique_ptr<Instance>> instances;
+    std::map<Inode, std::unique_ptr<Instance>> instances;
     std::uint64_t serial = 0;
 
-    void forget(const NamespaceIdentity& where, std::uint64_t serial);
+    void forget(const Inode& where, std::uint64_t serial);
 };
 
 /// What was seen of a process that is said to be the first of a sandbox.
@@ -64,7 +64,7 @@ SandboxInstances::candidateOf(const FileDescriptor& firstProcess) const
         const auto user = processOfPidfd(process.pidfd());
         auto space = openProcessNamespace(process.directory());
         if (!user || user->effectiveUser != user->realUser || !space || !isFirstOfItsNamespace(process) ||
-            identityOfNamespace(space.get()) == probe_.hostProcessNamespace()) {
+            inodeAt(space.get(), "") == probe_.hostProcessNamespace()) {
             return std::nullopt;
         }
         return Candidate{std::move(space), user->realUser};
@@ -95,12 +95,11 @@ SandboxInstances::Outcome SandboxInstances::registerInstance(const AuditToken& c
     instance->executable = *digest;
     instance->processNamespace = std::move(candidate->processNamespace);
     instance->firstProcess = std::move(firstProcess);
-    const auto where = identityOfNamespace(instance->processNamespace.get());
+    const auto where = inodeAt(instance->processNamespace.get(), "");
     return where ? insert(std::move(instance), *where) : Outcome{Refusal::invalid, "it is gone"};
 }
 
-SandboxInstances::Outcome SandboxInstances::insert(std::unique_ptr<Instance> instance,
-                                                   const NamespaceIdentity& where)
+SandboxInstances::Outcome SandboxInstances::insert(std::unique_ptr<Instance> instance, const Inode& where)
 {
     const std::lock_guard lock(table_->mutex);
     auto& instances = table_->instances;
@@ -124,7 +123,7 @@ SandboxInstances::Outcome SandboxInstances::insert(std::unique_ptr<Instance> ins
     return {};
 }
 
-void SandboxInstances::Table::forget(const NamespaceIdentity& where, std::uint64_t ofSerial)
+void SandboxInstances::Table::forget(const Inode& where, std::uint64_t ofSerial)
 {
     std::unique_ptr<Instance> gone;
     const std::lock_guard lock(mutex);
@@ -138,7 +137,7 @@ void SandboxInstances::Table::forget(const NamespaceIdentity& where, std::uint64
 std::optional<CodeSigningTask> SandboxInstances::taskOf(const ProcessInspection& process) const
 {
     std::optional<Sha256> executable;
-    const auto visit = [&](const NamespaceIdentity& where) {
+    const auto visit = [&](const Inode& where) {
         const std::lock_guard lock(table_->mutex);
         const auto found = table_->instances.find(where);
         if (found == table_->instances.end() || hasExited(found->second->firstProcess.get())) {

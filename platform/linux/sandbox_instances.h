@@ -54,7 +54,7 @@ private:
     struct Candidate;
     bool mayRegister(const AuditToken& caller) const;
     std::optional<Candidate> candidateOf(const FileDescriptor& firstProcess) const;
-    Outcome insert(std::unique_ptr<Instance> instance, const NamespaceIdentity& where);
+    Outcome insert(std::unique_ptr<Instance> instance, const Inode& where);
 
     const ConfinementProbe& probe_;
     SignatureStore& signatures_;

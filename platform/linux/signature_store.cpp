@@ -3,6 +3,7 @@
 #include "platform/linux/code_signature.h"
 #include "platform/linux/trusted_directory.h"
 
+#include <sys/stat.h>
 #include <sys/vfs.h>
 
 namespace typhon {
@@ -58,22 +59,25 @@ CodeSigningTask SignatureStore::read(const Sha256& executable, const std::vector
 
 CodeSigningTask SignatureStore::taskOfExecutable(const Sha256& executable)
 {
-    const auto stamp = stampOfPath(root_.real(signaturesDirectory) + "/" + fileNameFor(executable));
-    if (!stamp) {
+    struct stat status;
+    const auto path = root_.real(signaturesDirectory) + "/" + fileNameFor(executable);
+    if (::lstat(path.c_str(), &status) != 0) {
         return {};
     }
+    const FileIdentity file(status);
+    const bool isSettled = file.isSettled();
     const auto keys = keys_.current();
     {
         const std::lock_guard lock(mutex_);
         auto known = known_.find(executable);
-        if (known && known->stamp == *stamp && known->keys == keys) {
+        if (known && known->file == file && known->keys == keys) {
             return std::move(known->task);
         }
     }
     auto task = read(executable, *keys);
-    if (stamp->isSettled()) {
+    if (isSettled) {
         const std::lock_guard lock(mutex_);
-        known_.store(executable, {*stamp, keys, task});
+        known_.store(executable, {file, keys, task});
     }
     return task;
 }
@@ -81,26 +85,26 @@ CodeSigningTask SignatureStore::taskOfExecutable(const Sha256& executable)
 std::optional<Sha256> SignatureStore::digestOfExecutable(int descriptor)
 {
     struct statfs fileSystem;
-    if (::fstatfs(descriptor, &fileSystem) != 0 || fileSystem.f_type == fuse) {
+    struct stat status;
+    if (::fstatfs(descriptor, &fileSystem) != 0 || fileSystem.f_type == fuse ||
+        ::fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode) || status.st_size > executableLimit) {
         return std::nullopt;
     }
-    const auto stamp = stampOfRegularFile(descriptor);
-    if (!stamp || stamp->size > executableLimit) {
-        return std::nullopt;
-    }
+    const FileIdentity file(status);
+    const bool isSettled = file.isSettled();
     {
         const std::lock_guard lock(mutex_);
-        if (const auto digest = digests_.find(*stamp)) {
+        if (const auto digest = digests_.find(file)) {
             return digest;
         }
     }
     const auto digest = sha256OfFile(descriptor);
-    if (!digest || stampOfRegularFile(descriptor) != stamp) {
+    if (!digest || ::fstat(descriptor, &status) != 0 || FileIdentity(status) != file) {
         return std::nullopt;
     }
-    if (stamp->isSettled()) {
+    if (isSettled) {
         const std::lock_guard lock(mutex_);
-        digests_.store(*stamp, *digest);
+        digests_.store(file, *digest);
     }
     return digest;
 }

@@ -2,7 +2,7 @@
 
 #include "platform/code_signing.h"
 #include "platform/linux/bounded_cache.h"
-#include "platform/linux/file_stamp.h"
+#include "platform/linux/regular_file.h"
 #include "platform/linux/root_directory.h"
 #include "platform/linux/signing.h"
 #include "platform/linux/trusted_keys.h"
@@ -30,7 +30,7 @@ public:
 
 private:
     struct Known {
-        FileStamp stamp;
+        FileIdentity file;
         TrustedKeys::Snapshot keys;
         CodeSigningTask task;
     };
@@ -41,7 +41,7 @@ private:
     TrustedKeys keys_;
     std::mutex mutex_;
     BoundedCache<Sha256, Known> known_{4096};
-    BoundedCache<FileStamp, Sha256> digests_{4096};
+    BoundedCache<FileIdentity, Sha256> digests_{4096};
 };
 
 }  // namespace typhon

@@ -1,11 +1,12 @@
 #include "platform/linux/file_descriptor.h"
 #include "platform/linux/property_list_reader.h"
 #include "platform/linux/property_list_writer.h"
+#include "platform/linux/regular_file.h"
 #include "platform/linux/signing.h"
 
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
+#include <cstdlib>
 
 #include <fcntl.h>
 #include <sodium.h>
@@ -71,7 +72,7 @@ std::optional<std::string> writeNewFile(const std::string& path, const std::stri
     const FileDescriptor file(
         ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC | O_NOFOLLOW, mode));
     if (!file) {
-        return path + ": " + std::strerror(errno);
+        return path + ": " + errorText(errno);
     }
     const auto written = ::write(file.get(), text.data(), text.size());
     if (written != static_cast<ssize_t>(text.size()) || ::fsync(file.get()) != 0) {
@@ -82,14 +83,15 @@ std::optional<std::string> writeNewFile(const std::string& path, const std::stri
 
 Result<Bytes> readSmallFile(const std::string& path)
 {
-    const FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
-    Bytes bytes(keyFileLimits.bytes + 1);
-    const auto length = file ? ::read(file.get(), bytes.data(), bytes.size()) : -1;
-    if (length < 0) {
-        return {std::nullopt, path + ": " + std::strerror(errno)};
+    const auto opened = openRegularFile(path);
+    if (opened.error != 0) {
+        return {std::nullopt, path + ": " + opened.errorText()};
     }
-    bytes.resize(static_cast<std::size_t>(length));
-    return {std::move(bytes), {}};
+    auto contents = readWhole(opened.file.get(), keyFileLimits.bytes);
+    if (contents.error != 0) {
+        return {std::nullopt, path + ": " + errorText(contents.error)};
+    }
+    return {std::move(contents.bytes), {}};
 }
 
 }  // namespace

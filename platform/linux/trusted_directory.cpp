@@ -1,8 +1,9 @@
 #include "platform/linux/trusted_directory.h"
 
+#include "platform/linux/regular_file.h"
+
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
 #include <memory>
 
 #include <dirent.h>
@@ -22,7 +23,7 @@ bool belongsToUs(const struct stat& status)
 
 std::string lastError(const std::string& path)
 {
-    return path + ": " + std::strerror(errno);
+    return path + ": " + errorText(errno);
 }
 
 /// One step down; the error is empty when there is nothing of that name.
@@ -78,21 +79,16 @@ Result<Bytes> TrustedDirectory::read(const std::string& name, std::size_t limit)
         ::openat(directory_.get(), name.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
     struct stat status;
     if (!file || ::fstat(file.get(), &status) != 0) {
-        return {std::nullopt, std::strerror(errno)};
+        return {std::nullopt, errorText(errno)};
     }
     if (!S_ISREG(status.st_mode) || !belongsToUs(status)) {
         return {std::nullopt, "it can be changed by others than root and this daemon's user"};
     }
-    Bytes bytes(limit + 1);
-    std::size_t length = 0;
-    for (ssize_t count = 1; count > 0 && length < bytes.size(); length += static_cast<std::size_t>(count)) {
-        count = std::max<ssize_t>(::read(file.get(), bytes.data() + length, bytes.size() - length), 0);
+    auto contents = readWhole(file.get(), limit);
+    if (contents.error != 0) {
+        return {std::nullopt, errorText(contents.error)};
     }
-    if (length > limit) {
-        return {std::nullopt, "it is too large"};
-    }
-    bytes.resize(length);
-    return {std::move(bytes), {}};
+    return {std::move(contents.bytes), {}};
 }
 
 }  // namespace typhon

@@ -4,12 +4,20 @@
 
 #include <algorithm>
 
+#include <sys/stat.h>
+
 namespace typhon {
 
 namespace {
 
 constexpr std::size_t maximumKeys = 256;
 constexpr std::size_t keyFileLimit = 64 * 1024;
+
+std::optional<FileIdentity> stateOf(const std::string& path)
+{
+    struct stat status;
+    return ::lstat(path.c_str(), &status) == 0 ? std::optional(FileIdentity(status)) : std::nullopt;
+}
 
 }  // namespace
 
@@ -23,9 +31,8 @@ bool TrustedKeys::Seen::isSettled() const
 bool TrustedKeys::isUnchanged() const
 {
     const auto directory = root_.real(trustedKeysDirectory);
-    return stampOfPath(directory) == seen_.directory &&
-           std::ranges::all_of(seen_.files, [&](const auto& file) {
-               return stampOfPath(directory + "/" + file.first) == file.second;
+    return stateOf(directory) == seen_.directory && std::ranges::all_of(seen_.files, [&](const auto& file) {
+               return stateOf(directory + "/" + file.first) == file.second;
            });
 }
 
@@ -41,7 +48,7 @@ TrustedKeys::Snapshot TrustedKeys::current()
 void TrustedKeys::load()
 {
     const auto directoryPath = root_.real(trustedKeysDirectory);
-    Seen seen{stampOfPath(directoryPath), {}};
+    Seen seen{stateOf(directoryPath), {}};
     auto keys = std::make_shared<std::vector<TrustedKey>>();
     const auto directory = TrustedDirectory::open(root_, trustedKeysDirectory);
     std::vector<std::string> complaints;
@@ -53,7 +60,7 @@ void TrustedKeys::load()
             complaints.push_back(directoryPath + " holds too many keys");
             break;
         }
-        seen.files.emplace_back(name, stampOfPath(directoryPath + "/" + name));
+        seen.files.emplace_back(name, stateOf(directoryPath + "/" + name));
         const auto bytes = directory.value->read(name, keyFileLimit);
         auto key =
             bytes.value ? decodeTrustedKey(*bytes.value) : Result<TrustedKey>{std::nullopt, bytes.error};

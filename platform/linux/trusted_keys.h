@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/linux/file_stamp.h"
+#include "platform/linux/regular_file.h"
 #include "platform/linux/root_directory.h"
 #include "platform/linux/signing.h"
 #include "platform/log.h"
@@ -27,10 +27,10 @@ public:
     Snapshot current();
 
 private:
-    /// The stamps of the directory and of what it held.
+    /// The directory and what it held, each as it was.
     struct Seen {
-        std::optional<FileStamp> directory;
-        std::vector<std::pair<std::string, std::optional<FileStamp>>> files;
+        std::optional<FileIdentity> directory;
+        std::vector<std::pair<std::string, std::optional<FileIdentity>>> files;
         bool operator==(const Seen&) const = default;
         bool isSettled() const;
     };
