@@ -5,6 +5,7 @@
 #include <array>
 #include <cerrno>
 #include <memory>
+#include <string_view>
 #include <utility>
 
 #include <ft2build.h>

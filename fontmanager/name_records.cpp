@@ -1,9 +1,11 @@
 #include "fontmanager/name_records.h"
 
+#include "platform/linux/unicode.h"
+#include "platform/linux/visible_text.h"
+
 #include <algorithm>
-#include <cstdint>
 #include <span>
-#include <vector>
+#include <utility>
 
 #include <ft2build.h>
 
@@ -19,63 +21,6 @@ namespace typhon {
 namespace {
 
 constexpr FT_UInt mostNameRecords = 4096;
-
-void appendUtf8(std::string& text, char32_t c)
-{
-    const auto byte = [&](char32_t value) { text += static_cast<char>(value); };
-    if (c < 0x80) {
-        byte(c);
-    } else if (c < 0x800) {
-        byte(0xC0 | (c >> 6));
-        byte(0x80 | (c & 0x3F));
-    } else if (c < 0x10000) {
-        byte(0xE0 | (c >> 12));
-        byte(0x80 | ((c >> 6) & 0x3F));
-        byte(0x80 | (c & 0x3F));
-    } else {
-        byte(0xF0 | (c >> 18));
-        byte(0x80 | ((c >> 12) & 0x3F));
-        byte(0x80 | ((c >> 6) & 0x3F));
-        byte(0x80 | (c & 0x3F));
-    }
-}
-
-bool isHighSurrogate(char32_t unit)
-{
-    return unit >= 0xD800 && unit < 0xDC00;
-}
-
-bool isLowSurrogate(char32_t unit)
-{
-    return unit >= 0xDC00 && unit < 0xE000;
-}
-
-bool isControl(char32_t c)
-{
-    return c < 0x20 || (c >= 0x7F && c < 0xA0);
-}
-
-/// Null for half pairs and control characters.
-std::optional<std::string> fromUtf16BigEndian(std::span<const FT_Byte> bytes)
-{
-    if (bytes.size() % 2 != 0) {
-        return std::nullopt;
-    }
-    const auto unitAt = [&](std::size_t at) { return static_cast<char32_t>(bytes[at] << 8 | bytes[at + 1]); };
-    std::string text;
-    for (std::size_t at = 0; at < bytes.size(); at += 2) {
-        char32_t c = unitAt(at);
-        if (isHighSurrogate(c) && at + 3 < bytes.size() && isLowSurrogate(unitAt(at + 2))) {
-            c = 0x10000 + ((c - 0xD800) << 10) + (unitAt(at + 2) - 0xDC00);
-            at += 2;
-        }
-        if (isHighSurrogate(c) || isLowSurrogate(c) || isControl(c)) {
-            return std::nullopt;
-        }
-        appendUtf8(text, c);
-    }
-    return text;
-}
 
 /// The Macintosh encodings differ beyond ASCII; only what they share is taken.
 std::optional<std::string> fromAscii(std::span<const FT_Byte> bytes)
@@ -96,7 +41,7 @@ std::optional<std::string> textOf(const FT_SfntName& record)
 {
     const std::span bytes(record.string, record.string_len);
     if (isWindowsUnicode(record) || record.platform_id == TT_PLATFORM_APPLE_UNICODE) {
-        return fromUtf16BigEndian(bytes);
+        return utf8FromUtf16BigEndian(bytes);
     }
     const bool isRoman = record.platform_id == TT_PLATFORM_MACINTOSH && record.encoding_id == TT_MAC_ID_ROMAN;
     return isRoman ? fromAscii(bytes) : std::nullopt;
@@ -131,7 +76,7 @@ std::optional<std::string> nameOf(FT_Face face, FT_UShort nameIdentifier, std::s
             continue;
         }
         auto text = textOf(record);
-        if (text && !text->empty() && text->size() <= limit) {
+        if (text && !text->empty() && text->size() <= limit && *text == visibleText(*text)) {
             best = std::move(text);
             bestPreference = preference(record);
         }

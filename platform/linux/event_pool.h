@@ -17,8 +17,7 @@ public:
     };
 
     /// A watched descriptor. One event at a time: after the handler was called, nothing more is reported
-    /// until `arm`. Destroying the watch stops it; a handler that is already running, or just about to,
-    /// goes on, so it must own what it uses.
+    /// until `arm`. Destroying the watch stops it; a handler that is already running goes on.
     class Watch {
     public:
         virtual ~Watch() = default;
@@ -28,15 +27,10 @@ public:
 
     explicit EventPool(Options options);
     EventPool() : EventPool(Options{}) {}
-    /// Stops.
+    /// Waits for the running jobs; jobs that have not started are dropped.
     ~EventPool();
     EventPool(const EventPool&) = delete;
     EventPool& operator=(const EventPool&) = delete;
-
-    /// Waits for the running jobs and handlers, and ends all threads; jobs that have not started, and all
-    /// later ones, are dropped. Not on a pool thread. For a shutdown in order: afterwards nothing runs any
-    /// more that could use what is destroyed next.
-    void stop();
 
     /// Runs `job` on a pool thread. Jobs start in the order of posting.
     void post(std::function<void()> job);
@@ -45,16 +39,14 @@ public:
     /// pool thread.
     std::unique_ptr<Watch> watch(int descriptor, std::function<void(std::uint32_t)> handler);
 
-    /// Threads running at present, and the most there may be.
+    /// Threads running at present.
     unsigned threadCount() const;
-    unsigned maximumThreads() const;
     /// True on a thread of this pool.
     bool isPoolThread() const;
 
-    class Impl;
-
 private:
-    std::shared_ptr<Impl> impl_;
+    class Impl;
+    std::unique_ptr<Impl> impl_;
 };
 
 }  // namespace typhon

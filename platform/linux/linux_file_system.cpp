@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <memory>
 #include <string_view>
 
@@ -47,8 +48,14 @@ PropertyListReading LinuxFileSystem::readPropertyList(const std::string& path)
         return failure("not an absolute path");
     }
     const auto opened = openRegularFile(*real);
-    return opened.error == 0 ? readPropertyListFromDescriptor(opened.file.get())
-                             : failure(opened.errorText());
+    if (opened.error != 0) {
+        return failure(opened.errorText());
+    }
+    const PropertyListLimits limits;
+    if (static_cast<std::uint64_t>(opened.status.st_size) > limits.bytes) {
+        return failure("larger than " + std::to_string(limits.bytes) + " bytes");
+    }
+    return readPropertyListFromDescriptor(opened.file.get(), limits);
 }
 
 std::optional<std::vector<std::string>> LinuxFileSystem::contentsOfDirectory(const std::string& path)

@@ -2,6 +2,7 @@
 
 #include "platform/log.h"
 
+#include <mutex>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -30,6 +31,8 @@ private:
     const LogLevel minimum_;
     const Destination destination_;
     const int descriptor_;
+    /// Not every file keeps concurrent writes of one process apart.
+    std::mutex writing_;
 };
 
 /// `debug`, `default` or `error`; `daemon` or `system`.
