@@ -17,7 +17,8 @@ public:
     };
 
     /// A watched descriptor. One event at a time: after the handler was called, nothing more is reported
-    /// until `arm`. Destroying the watch stops it; a handler that is already running goes on.
+    /// until `arm`. Destroying the watch stops it; a handler that is already running, or just about to,
+    /// goes on, so it must own what it uses.
     class Watch {
     public:
         virtual ~Watch() = default;
@@ -27,10 +28,15 @@ public:
 
     explicit EventPool(Options options);
     EventPool() : EventPool(Options{}) {}
-    /// Waits for the running jobs; jobs that have not started are dropped.
+    /// Stops.
     ~EventPool();
     EventPool(const EventPool&) = delete;
     EventPool& operator=(const EventPool&) = delete;
+
+    /// Waits for the running jobs and handlers, and ends all threads; jobs that have not started, and all
+    /// later ones, are dropped. Not on a pool thread. For a shutdown in order: afterwards nothing runs any
+    /// more that could use what is destroyed next.
+    void stop();
 
     /// Runs `job` on a pool thread. Jobs start in the order of posting.
     void post(std::function<void()> job);
@@ -39,14 +45,16 @@ public:
     /// pool thread.
     std::unique_ptr<Watch> watch(int descriptor, std::function<void(std::uint32_t)> handler);
 
-    /// Threads running at present.
+    /// Threads running at present, and the most there may be.
     unsigned threadCount() const;
+    unsigned maximumThreads() const;
     /// True on a thread of this pool.
     bool isPoolThread() const;
 
-private:
     class Impl;
-    std::unique_ptr<Impl> impl_;
+
+private:
+    std::shared_ptr<Impl> impl_;
 };
 
 }  // namespace typhon

@@ -8,6 +8,7 @@
 #include <string_view>
 
 #include <fcntl.h>
+#include <poll.h>
 #include <sys/ioctl.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
@@ -60,7 +61,7 @@ std::optional<PidfdProcess> processFromProc(int pidfd)
     if (pid <= 0 || ::stat(("/proc/" + std::to_string(pid)).c_str(), &status) != 0) {
         return std::nullopt;
     }
-    return PidfdProcess{pid, status.st_uid};
+    return PidfdProcess{pid, status.st_uid, status.st_uid};
 }
 
 }  // namespace
@@ -68,6 +69,15 @@ std::optional<PidfdProcess> processFromProc(int pidfd)
 FileDescriptor openPidfd(pid_t processIdentifier)
 {
     return FileDescriptor(static_cast<int>(::syscall(SYS_pidfd_open, processIdentifier, 0)));
+}
+
+bool isPidfd(int descriptor)
+{
+    constexpr std::string_view expected = "anon_inode:[pidfd]";
+    std::array<char, 64> target;
+    const auto link = "/proc/self/fd/" + std::to_string(descriptor);
+    const auto length = ::readlink(link.c_str(), target.data(), target.size());
+    return length > 0 && std::string_view(target.data(), static_cast<std::size_t>(length)) == expected;
 }
 
 std::optional<PidfdProcess> processOfPidfd(int pidfd)
@@ -82,7 +92,13 @@ std::optional<PidfdProcess> processOfPidfd(int pidfd)
         info.pid != info.threadGroup) {
         return std::nullopt;
     }
-    return PidfdProcess{static_cast<pid_t>(info.pid), info.effectiveUser};
+    return PidfdProcess{static_cast<pid_t>(info.pid), info.effectiveUser, info.realUser};
+}
+
+bool hasExited(int pidfd)
+{
+    pollfd descriptor{.fd = pidfd, .events = POLLIN, .revents = 0};
+    return ::poll(&descriptor, 1, 0) != 0;
 }
 
 std::optional<std::uint64_t> inodeOfPidfd(int pidfd)

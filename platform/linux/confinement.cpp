@@ -1,0 +1,110 @@
+#include "platform/linux/confinement.h"
+
+#include <string>
+#include <string_view>
+
+#include <fcntl.h>
+#include <linux/stat.h>
+#include <sys/stat.h>
+
+#ifndef STATX_MNT_ID_UNIQUE
+#define STATX_MNT_ID_UNIQUE 0x00004000U
+#endif
+
+// What can be seen of a sandbox from outside: namespaces, root, seccomp filter, LSM label. A Landlock domain
+// cannot be seen. Files that sandboxes describe themselves with (".flatpak-info") prove nothing, since
+// anybody can put one at the root of a sandbox of his own, and are not looked at.
+
+namespace typhon {
+
+namespace {
+
+/// Under `--ro-bind / /` the root is the same directory on another mount, so the mount counts.
+std::optional<std::array<std::uint64_t, 3>> rootOf(int processDirectory)
+{
+    struct statx status;
+    for (const unsigned mountId : {STATX_MNT_ID_UNIQUE, static_cast<unsigned>(STATX_MNT_ID)}) {
+        if (::statx(processDirectory, "root", 0, STATX_INO | mountId, &status) != 0) {
+            return std::nullopt;
+        }
+        if ((status.stx_mask & mountId) != 0) {
+            const auto device = (std::uint64_t{status.stx_dev_major} << 32) | status.stx_dev_minor;
+            return std::array<std::uint64_t, 3>{status.stx_mnt_id, device, status.stx_ino};
+        }
+    }
+    return std::nullopt;
+}
+
+/// True when the label of an AppArmor or SELinux process leaves it unconfined.
+bool isUnconfined(std::string_view label)
+{
+    while (!label.empty() && (label.back() == '\n' || label.back() == '\0')) {
+        label.remove_suffix(1);
+    }
+    return label == "unconfined" || label.ends_with(" (unconfined)") ||
+           label.find(":unconfined_t:") != std::string_view::npos || label.ends_with(":unconfined_t");
+}
+
+/// The value of a line of /proc/PID/status, or empty.
+std::string_view statusLine(std::string_view status, std::string_view name)
+{
+    const auto start = status.find(name);
+    if (start == std::string_view::npos) {
+        return {};
+    }
+    const auto from = start + name.size();
+    return status.substr(from, status.find('\n', from) - from);
+}
+
+}  // namespace
+
+ConfinementProbe::View ConfinementProbe::viewOf(int directory)
+{
+    return {inodeAt(directory, "ns/mnt"), inodeAt(directory, "ns/user"), inodeAt(directory, "ns/pid"),
+            rootOf(directory)};
+}
+
+ConfinementProbe::ConfinementProbe()
+{
+    const FileDescriptor one(::open("/proc/1", O_PATH | O_DIRECTORY | O_CLOEXEC));
+    const FileDescriptor self(::open("/proc/self", O_PATH | O_DIRECTORY | O_CLOEXEC));
+    host_ = viewOf(one.get());
+    isProcessOne_ = host_.isWhole();
+    if (!isProcessOne_) {
+        host_ = viewOf(self.get());
+    }
+    // Without a labelling LSM the file exists and reading it fails.
+    const FileDescriptor label(::openat(self.get(), "attr/current", O_RDONLY | O_CLOEXEC));
+    char first = 0;
+    hasLabels_ = label && ::read(label.get(), &first, 1) > 0;
+}
+
+bool ConfinementProbe::isRestricted(const ProcessInspection& process) const
+{
+    const auto status = process.contents("status", 8192);
+    const auto seccomp = status ? statusLine(*status, "\nSeccomp:\t") : std::string_view();
+    if (seccomp != "0") {
+        return true;
+    }
+    if (!hasLabels_) {
+        return false;
+    }
+    const auto label = process.contents("attr/current", 4096);
+    return !label || !isUnconfined(*label);
+}
+
+Confinement ConfinementProbe::look(const ProcessInspection& process) const
+{
+    const auto view = viewOf(process.directory());
+    if (!host_.isWhole() || !view.isWhole()) {
+        return {};
+    }
+    Confinement seen;
+    seen.hasOwnProcessNamespace = view.process != host_.process;
+    seen.hasOwnUserNamespace = view.user != host_.user;
+    seen.isSandboxed = seen.hasOwnProcessNamespace || seen.hasOwnUserNamespace || view.mount != host_.mount ||
+                       view.root != host_.root || isRestricted(process);
+    return seen;
+}
+
+}  // namespace typhon

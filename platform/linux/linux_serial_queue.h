@@ -1,0 +1,62 @@
+#pragma once
+
+#include "platform/linux/executor.h"
+#include "platform/linux/linux_queue.h"
+
+#include <condition_variable>
+#include <deque>
+#include <memory>
+#include <mutex>
+#include <string>
+
+namespace typhon {
+
+/// A serial queue whose slices run on an executor's threads, and in `sync` on the caller's.
+class LinuxSerialQueue : public LinuxQueue {
+public:
+    LinuxSerialQueue(std::string label, std::shared_ptr<Executor> executor);
+
+    const std::string& label() const final { return label_; }
+    void sync(const std::function<void()>& work) override;
+    void continueItem(const std::shared_ptr<LinuxWorkItem>& item, std::coroutine_handle<> suspended) final;
+    void itemEnded(LinuxWorkItem& item) final;
+    void close() final;
+
+protected:
+    void start(Task<void> body, WorkItem* awaitedBy, std::shared_ptr<void> connection) final;
+    bool isSerial() const final { return true; }
+    const Executor& executor() const { return *executor_; }
+
+private:
+    using Lock = std::unique_lock<std::mutex>;
+
+    bool mayRunHere(const LinuxWorkItem& item, const WorkItem* awaitedBy) const;
+    void waitForTurn(Lock& lock, const std::shared_ptr<LinuxWorkItem>& item);
+    void runSlice(Lock& lock);
+    void runSlices();
+    void announceIfReady(Lock& lock);
+
+    const std::string label_;
+    const std::shared_ptr<Executor> executor_;
+
+    std::mutex mutex_;
+    // All below is protected by mutex_.
+    std::condition_variable turn_;
+    unsigned waitingThreads_ = 0;
+    std::shared_ptr<LinuxWorkItem> running_;
+    std::deque<std::shared_ptr<LinuxWorkItem>> waiting_;
+    /// Where the running item goes on, once some thread takes it.
+    std::coroutine_handle<> ready_;
+    /// A thread runs a slice, and looks at ready_ when it has returned.
+    bool sliceRuns_ = false;
+    bool closed_ = false;
+};
+
+/// The serial queue of the main thread: `sync` from elsewhere runs the work there too.
+class LinuxMainQueue final : public LinuxSerialQueue {
+public:
+    using LinuxSerialQueue::LinuxSerialQueue;
+    void sync(const std::function<void()>& work) override;
+};
+
+}  // namespace typhon

@@ -1,0 +1,112 @@
+#include "platform/linux/signature_store.h"
+
+#include "platform/linux/code_signature.h"
+#include "platform/linux/trusted_directory.h"
+
+#include <sys/stat.h>
+#include <sys/vfs.h>
+
+namespace typhon {
+
+namespace {
+
+constexpr std::int64_t executableLimit = std::int64_t{1} << 30;
+/// A file system in user space answers whenever and whatever its owner likes.
+constexpr long fuse = 0x65735546;
+
+std::string fileNameFor(const Sha256& executable)
+{
+    return hexOf(executable) + ".plist";
+}
+
+/// The statement of a signature file, if it counts.
+Result<CodeStatement> believedStatement(const Bytes& bytes, const Sha256& executable,
+                                        const std::vector<TrustedKey>& keys)
+{
+    const auto signature = decodeSignature(bytes);
+    if (!signature.value) {
+        return {std::nullopt, signature.error};
+    }
+    auto statement = verifiedStatement(*signature.value);
+    if (!statement.value) {
+        return statement;
+    }
+    if (statement.value->executable != executable) {
+        return {std::nullopt, "it is for another executable"};
+    }
+    if (!isTrusted(keys, signature.value->key, *statement.value)) {
+        return {std::nullopt, "its key is not trusted to sign it"};
+    }
+    return statement;
+}
+
+}  // namespace
+
+CodeSigningTask SignatureStore::read(const Sha256& executable, const std::vector<TrustedKey>& keys)
+{
+    const auto name = fileNameFor(executable);
+    const auto directory = TrustedDirectory::open(root_, signaturesDirectory);
+    const auto bytes = directory.value ? directory.value->read(name, signatureFileLimit)
+                                       : Result<Bytes>{std::nullopt, directory.error};
+    auto statement = bytes.value ? believedStatement(*bytes.value, executable, keys)
+                                 : Result<CodeStatement>{std::nullopt, bytes.error};
+    if (!statement.value) {
+        TYLog_Error(log_, "signature " + name + " does not count: " + statement.error);
+        return {};
+    }
+    return {std::move(statement.value->identifier), std::move(statement.value->entitlements)};
+}
+
+CodeSigningTask SignatureStore::taskOfExecutable(const Sha256& executable)
+{
+    struct stat status;
+    const auto path = root_.real(signaturesDirectory) + "/" + fileNameFor(executable);
+    if (::lstat(path.c_str(), &status) != 0) {
+        return {};
+    }
+    const FileIdentity file(status);
+    const bool isSettled = file.isSettled();
+    const auto keys = keys_.current();
+    {
+        const std::lock_guard lock(mutex_);
+        auto known = known_.find(executable);
+        if (known && known->file == file && known->keys == keys) {
+            return std::move(known->task);
+        }
+    }
+    auto task = read(executable, *keys);
+    if (isSettled) {
+        const std::lock_guard lock(mutex_);
+        known_.store(executable, {file, keys, task});
+    }
+    return task;
+}
+
+std::optional<Sha256> SignatureStore::digestOfExecutable(int descriptor)
+{
+    struct statfs fileSystem;
+    struct stat status;
+    if (::fstatfs(descriptor, &fileSystem) != 0 || fileSystem.f_type == fuse ||
+        ::fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode) || status.st_size > executableLimit) {
+        return std::nullopt;
+    }
+    const FileIdentity file(status);
+    const bool isSettled = file.isSettled();
+    {
+        const std::lock_guard lock(mutex_);
+        if (const auto digest = digests_.find(file)) {
+            return digest;
+        }
+    }
+    const auto digest = sha256OfFile(descriptor);
+    if (!digest || ::fstat(descriptor, &status) != 0 || FileIdentity(status) != file) {
+        return std::nullopt;
+    }
+    if (isSettled) {
+        const std::lock_guard lock(mutex_);
+        digests_.store(file, *digest);
+    }
+    return digest;
+}
+
+}  // namespace typhon

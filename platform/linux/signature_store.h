@@ -1,0 +1,47 @@
+#pragma once
+
+#include "platform/code_signing.h"
+#include "platform/linux/bounded_cache.h"
+#include "platform/linux/regular_file.h"
+#include "platform/linux/root_directory.h"
+#include "platform/linux/signing.h"
+#include "platform/linux/trusted_keys.h"
+#include "platform/log.h"
+
+#include <mutex>
+#include <optional>
+#include <string>
+
+namespace typhon {
+
+/// What the signatures in /var/lib/typhon/signatures say about executables, as far as the trusted keys of the
+/// moment may say it. Any thread; blocks on the disk.
+class SignatureStore {
+public:
+    /// `root` and `log` outlive this.
+    SignatureStore(const RootDirectory& root, Log& log) : root_(root), log_(log), keys_(root, log) {}
+
+    /// The identifier and entitlements of an executable with that digest; neither without a valid signature.
+    CodeSigningTask taskOfExecutable(const Sha256& executable);
+
+    /// The digest of an executable file, computed once for as long as it is not changed. Null for anything
+    /// but a readable regular file of reasonable size on a file system that the kernel itself serves.
+    std::optional<Sha256> digestOfExecutable(int descriptor);
+
+private:
+    struct Known {
+        FileIdentity file;
+        TrustedKeys::Snapshot keys;
+        CodeSigningTask task;
+    };
+    CodeSigningTask read(const Sha256& executable, const std::vector<TrustedKey>& keys);
+
+    const RootDirectory& root_;
+    Log& log_;
+    TrustedKeys keys_;
+    std::mutex mutex_;
+    BoundedCache<Sha256, Known> known_{4096};
+    BoundedCache<FileIdentity, Sha256> digests_{4096};
+};
+
+}  // namespace typhon
