@@ -1,0 +1,6 @@
+#include "tools/commands/command.h"
+
+int main(int argumentCount, char** arguments)
+{
+    return typhon::runCommandLine(argumentCount, arguments);
+}
