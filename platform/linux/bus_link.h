@@ -1,0 +1,139 @@
+#pragma once
+
+#include "platform/ipc.h"
+#include "platform/linux/event_pool.h"
+#include "platform/linux/file_descriptor.h"
+#include "platform/linux/ipc_context.h"
+#include "platform/linux/message_size_guard.h"
+#include "platform/linux/outgoing_queue.h"
+
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include <systemd/sd-bus.h>
+
+namespace typhon {
+
+struct BusMessageUnref {
+    void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
+};
+/// Created, used and dropped under the lock of its link.
+using BusMessage = std::unique_ptr<sd_bus_message, BusMessageUnref>;
+
+/// One sd-bus object over one connected socket, from the handshake to the end: reads when the socket is
+/// ready, writes from any thread, matches replies to calls, and closes itself when a limit is exceeded. Any
+/// thread.
+class BusLink : public std::enable_shared_from_this<BusLink> {
+public:
+    enum class Role { server, client };
+    /// What is left to do once the lock is released.
+    using Afterwards = std::vector<std::function<void()>>;
+
+    /// Told what arrives, under the link's lock: it may answer, and leaves everything else for afterwards.
+    class Owner {
+    public:
+        virtual ~Owner() = default;
+        virtual void receivedCall(BusLink& link, sd_bus_message* call, Afterwards& afterwards) = 0;
+        /// Once, unless `close` was called before.
+        virtual void linkClosed(BusLink& link, Afterwards& afterwards) = 0;
+    };
+
+    /// Called under the link's lock.
+    using Completion = std::function<void(CallResult, Afterwards&)>;
+    struct OutgoingCall {
+        std::string interface;
+        std::string member;
+        std::string inTypes;
+        std::string outTypes;
+        Arguments arguments;
+        bool expectReply;
+        /// Nanoseconds; zero for none.
+        std::int64_t timeout;
+        Completion completion;
+    };
+
+    BusLink(std::shared_ptr<IpcContext> context, FileDescriptor socket, Role role, AuditToken peer,
+            std::weak_ptr<Owner> owner);
+    ~BusLink();
+
+    /// Begins the handshake; the owner is told when that fails.
+    void start();
+    /// Ends the link without telling the owner; pending calls fail with `disconnected`.
+    void close();
+
+    /// Sends a call, once the handshake is done.
+    void call(OutgoingCall call);
+    /// Answers a call by its cookie.
+    void reply(std::uint64_t cookie, const std::string& types, const Arguments& results,
+               const std::string& member);
+    void fail(std::uint64_t cookie, const IpcError& error);
+
+    /// The same, by an owner that was just told of the call.
+    void replyLocked(std::uint64_t cookie, const std::string& types, const Arguments& results,
+                     const std::string& member, Afterwards& afterwards);
+    void failLocked(std::uint64_t cookie, const IpcError& error, Afterwards& afterwards);
+    /// Closes because of the peer's behaviour, and logs why.
+    void abandonLocked(const std::string& reason, Afterwards& afterwards);
+
+    const AuditToken peer;
+
+private:
+    struct PendingCall {
+        OutgoingCall call;
+        /// Zero until it was sent.
+        std::uint64_t cookie = 0;
+        std::unique_ptr<Timer> timer;
+    };
+
+    enum class Progress { none, some, message, ended };
+
+    template <class Body>
+    void locked(Body body);
+    int open();
+    void handleEvents();
+    void processInput(Afterwards& afterwards);
+    Progress processOnce(Afterwards& afterwards);
+    void becomeReady(Afterwards& afterwards);
+    void receive(sd_bus_message* message, Afterwards& afterwards);
+    void complete(sd_bus_message* message, Afterwards& afterwards);
+    void completeCall(std::uint64_t number, CallResult result, Afterwards& afterwards);
+    void transmit(std::uint64_t number, Afterwards& afterwards);
+    BusMessage newCall(const OutgoingCall& call);
+    bool send(BusMessage message, const MessageAppending& size, std::uint64_t* cookie,
+              Afterwards& afterwards);
+    BusMessage callToAnswer(std::uint64_t cookie);
+    void checkOutgoing(Afterwards& afterwards);
+    void arm();
+    void end(Afterwards& afterwards, bool tellOwner);
+    std::unique_ptr<Timer> startTimer(std::chrono::nanoseconds delay, std::function<void(BusLink&)> handler);
+    static int sawMessage(sd_bus_message* message, void* link, sd_bus_error* error);
+
+    const std::shared_ptr<IpcContext> context_;
+    const Role role_;
+    const std::weak_ptr<Owner> owner_;
+
+    std::mutex mutex_;
+    // Below: protected by the mutex.
+    FileDescriptor socket_;
+    sd_bus* bus_ = nullptr;
+    std::unique_ptr<EventPool::Watch> watch_;
+    std::unique_ptr<Timer> handshakeTimer_;
+    bool ready_ = false;
+    bool ended_ = false;
+    bool descriptorsAllowed_ = false;
+    /// The handshake may have read messages ahead, which the socket does not announce.
+    bool draining_ = true;
+    bool sawMessage_ = false;
+    MessageSizeGuard sizeGuard_;
+    OutgoingQueue outgoing_;
+    std::uint64_t lastNumber_ = 0;
+    std::map<std::uint64_t, PendingCall> pending_;
+    std::map<std::uint64_t, std::uint64_t> numberByCookie_;
+};
+
+}  // namespace typhon

@@ -1,0 +1,30 @@
+#pragma once
+
+#include "platform/linux/bus_message_codec.h"
+
+#include <chrono>
+#include <cstddef>
+
+namespace typhon {
+
+/// What peers may cost. Whatever goes beyond is refused or closed, and logged once for each offender.
+struct IpcLimits {
+    /// Accepted connections of one process, and of all processes of one user.
+    unsigned connectionsPerProcess = 256;
+    unsigned connectionsPerUser = 16384;
+    /// Calls of one connection that were read and neither answered nor dropped, and the memory of their
+    /// arguments. Further calls get `LimitsExceeded`; one that expects no reply closes the connection.
+    unsigned unansweredCalls = 64;
+    std::size_t unansweredBytes = 64U << 20;
+    /// What one peer may leave unread beyond the socket's own buffer before its connection is closed.
+    std::size_t queuedBytes = 64U << 20;
+    std::size_t queuedMessages = 4096;
+    /// Descriptors sent to one peer since it last had read everything.
+    unsigned unreadDescriptors = 64;
+    /// One incoming message; its bytes are also the most that is read of it at all.
+    MessageLimits message;
+    /// From accepting or connecting to the end of the D-Bus handshake.
+    std::chrono::nanoseconds handshake = std::chrono::seconds(25);
+};
+
+}  // namespace typhon

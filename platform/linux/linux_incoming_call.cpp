@@ -1,0 +1,46 @@
+#include "platform/linux/linux_incoming_call.h"
+
+#include <utility>
+
+namespace typhon {
+
+LinuxIncomingCall::LinuxIncomingCall(Origin origin, std::string interface, const MemberDescription& member,
+                                     Arguments arguments, std::unique_ptr<UnansweredCalls::Charge> charge)
+    : origin_(std::move(origin)), interface_(std::move(interface)), member_(member),
+      arguments_(std::move(arguments)), charge_(std::move(charge))
+{}
+
+void LinuxIncomingCall::reply(Arguments results)
+{
+    if (!member_.replies) {
+        return;
+    }
+    if (const auto link = takeAnswer()) {
+        link->reply(origin_.cookie, member_.outTypes, results, member_.name);
+    }
+}
+
+void LinuxIncomingCall::fail(IpcError error)
+{
+    if (const auto link = takeAnswer()) {
+        link->fail(origin_.cookie, error);
+    }
+}
+
+void LinuxIncomingCall::handled()
+{
+    const std::lock_guard lock(mutex_);
+    if (!member_.replies || !origin_.replyExpected) {
+        charge_.reset();
+    }
+}
+
+std::shared_ptr<BusLink> LinuxIncomingCall::takeAnswer()
+{
+    const std::lock_guard lock(mutex_);
+    charge_.reset();
+    const bool first = !std::exchange(answered_, true);
+    return first && origin_.replyExpected ? origin_.link.lock() : nullptr;
+}
+
+}  // namespace typhon

@@ -1,0 +1,48 @@
+#pragma once
+
+#include "platform/ipc.h"
+#include "platform/linux/bus_link.h"
+#include "platform/linux/unanswered_calls.h"
+
+#include <cstdint>
+#include <memory>
+#include <mutex>
+#include <string>
+
+namespace typhon {
+
+/// A call that arrived over a link. It keeps the link's cookie for the answer, not the message.
+class LinuxIncomingCall : public IncomingCall {
+public:
+    struct Origin {
+        std::weak_ptr<BusLink> link;
+        std::uint64_t cookie;
+        bool replyExpected;
+    };
+    LinuxIncomingCall(Origin origin, std::string interface, const MemberDescription& member,
+                      Arguments arguments, std::unique_ptr<UnansweredCalls::Charge> charge);
+
+    const std::string& interface() const override { return interface_; }
+    const std::string& member() const override { return member_.name; }
+    const Arguments& arguments() const override { return arguments_; }
+    bool isReplyExpected() const override { return origin_.replyExpected; }
+    void reply(Arguments results) override;
+    void fail(IpcError error) override;
+
+    /// Its handler has ended: a call that no answer belongs to stops counting as unanswered.
+    void handled();
+
+private:
+    /// The link to answer on, the first time; null afterwards, and when nobody waits.
+    std::shared_ptr<BusLink> takeAnswer();
+
+    const Origin origin_;
+    const std::string interface_;
+    const MemberDescription member_;
+    const Arguments arguments_;
+    std::mutex mutex_;
+    std::unique_ptr<UnansweredCalls::Charge> charge_;
+    bool answered_ = false;
+};
+
+}  // namespace typhon

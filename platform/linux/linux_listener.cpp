@@ -1,0 +1,198 @@
+#include "platform/linux/linux_listener.h"
+
+#include "platform/linux/bus_message.h"
+#include "platform/linux/linux_connection.h"
+
+#include <cerrno>
+#include <cstring>
+#include <utility>
+
+#include <fcntl.h>
+#include <sys/epoll.h>
+#include <sys/socket.h>
+
+namespace typhon {
+
+namespace {
+
+constexpr auto retryDelay = std::chrono::milliseconds(100);
+
+FileDescriptor acceptFrom(int listening)
+{
+    return FileDescriptor(::accept4(listening, nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+}
+
+FileDescriptor newReserve()
+{
+    return FileDescriptor(::open("/dev/null", O_RDONLY | O_CLOEXEC));
+}
+
+}  // namespace
+
+LinuxListener::LinuxListener(std::shared_ptr<IpcContext> context, std::string name, ListeningSocket socket,
+                             BusLink::Role role)
+    : context_(std::move(context)), name_(std::move(name)), role_(role),
+      socket_(std::make_shared<const ListeningSocket>(std::move(socket))), reserve_(newReserve())
+{}
+
+LinuxListener::~LinuxListener()
+{
+    closeSocket();
+}
+
+void LinuxListener::setDelegate(std::weak_ptr<ListenerDelegate> delegate)
+{
+    const std::lock_guard lock(mutex_);
+    delegate_ = std::move(delegate);
+}
+
+void LinuxListener::resume()
+{
+    const auto self = shared_from_this();
+    {
+        const std::lock_guard lock(mutex_);
+        if (!socket_ || !socket_->socket || watch_) {
+            return;
+        }
+        watch_ = context_->pool.watch(socket_->socket.get(), [weak = weak_from_this()](std::uint32_t) {
+            if (const auto listener = weak.lock()) {
+                listener->handleEvents();
+            }
+        });
+    }
+    context_->listeners.add(self);
+    arm();
+}
+
+void LinuxListener::invalidate()
+{
+    {
+        const std::lock_guard lock(mutex_);
+        closeSocket();
+    }
+    context_->listeners.remove(this);
+}
+
+void LinuxListener::closeSocket()
+{
+    watch_.reset();
+    context_->dispose(std::move(retry_));
+    if (socket_ && socket_->socket && !socket_->path.empty()) {
+        ::unlink(socket_->path.c_str());
+    }
+    socket_.reset();
+}
+
+std::shared_ptr<ListenerEndpoint> LinuxListener::endpoint() const
+{
+    const std::lock_guard lock(mutex_);
+    if (!socket_ || !socket_->endpoint) {
+        return nullptr;
+    }
+    FileDescriptor copy(::fcntl(socket_->endpoint.get(), F_DUPFD_CLOEXEC, 3));
+    return copy ? std::make_shared<LinuxTransferredFile>(std::move(copy)) : nullptr;
+}
+
+void LinuxListener::arm()
+{
+    const std::lock_guard lock(mutex_);
+    if (watch_) {
+        watch_->arm(EPOLLIN);
+    }
+}
+
+void LinuxListener::armLater()
+{
+    const std::lock_guard lock(mutex_);
+    if (!watch_) {
+        return;
+    }
+    if (!retry_) {
+        retry_ = context_->queues.createTimer(*context_->deadlines, [weak = weak_from_this()] {
+            if (const auto self = weak.lock()) {
+                self->arm();
+            }
+        });
+    }
+    retry_->schedule(retryDelay, retryDelay);
+}
+
+void LinuxListener::handleEvents()
+{
+    std::shared_ptr<const ListeningSocket> socket;
+    {
+        const std::lock_guard lock(mutex_);
+        socket = socket_;
+    }
+    constexpr int atOnce = 16;
+    auto outcome = socket ? Accepting::more : Accepting::done;
+    for (int count = 0; outcome == Accepting::more && count < atOnce; ++count) {
+        outcome = acceptOne(socket->socket.get());
+    }
+    if (outcome == Accepting::later) {
+        armLater();
+    } else {
+        arm();
+    }
+}
+
+LinuxListener::Accepting LinuxListener::acceptOne(int listening)
+{
+    auto accepted = acceptFrom(listening);
+    if (!accepted) {
+        return acceptFailed(listening, errno);
+    }
+    shortageLogged_ = false;
+    offer(std::move(accepted));
+    return Accepting::more;
+}
+
+LinuxListener::Accepting LinuxListener::acceptFailed(int listening, int error)
+{
+    if (error == EAGAIN) {
+        return Accepting::done;
+    }
+    if (error == EINTR || error == ECONNABORTED) {
+        return Accepting::more;
+    }
+    if (!std::exchange(shortageLogged_, true)) {
+        TYLog_Error(context_->log, "connections to " + name_ + " are refused: " + std::strerror(error));
+    }
+    if (error != EMFILE && error != ENFILE) {
+        return Accepting::later;
+    }
+    // Left alone the newcomer would wake us again at once, for ever.
+    reserve_ = FileDescriptor();
+    const bool refused = static_cast<bool>(acceptFrom(listening));
+    reserve_ = newReserve();
+    return refused && reserve_ ? Accepting::more : Accepting::later;
+}
+
+void LinuxListener::offer(FileDescriptor socket)
+{
+    const auto peer = context_->identifyPeer(socket.get());
+    auto admission = context_->accounting->admit(peer);
+    if (!admission.refusal.empty()) {
+        TYLog_Error(context_->log, admission.refusal);
+    }
+    std::shared_ptr<ListenerDelegate> delegate;
+    {
+        const std::lock_guard lock(mutex_);
+        delegate = delegate_.lock();
+    }
+    if (!admission.charge || !delegate) {
+        return;
+    }
+    auto once = std::make_shared<FileDescriptor>(std::move(socket));
+    auto connector = [once, peer, role = role_]() -> ConnectedSocket {
+        return {std::move(*once), peer, role, "the connection was used up"};
+    };
+    auto connection =
+        std::make_shared<LinuxConnection>(context_, LinuxConnection::Lifetime::oneSocket,
+                                          std::move(connector), peer, std::move(admission.charge));
+    if (!delegate->listener(*this, connection)) {
+        connection->invalidate();
+    }
+}
+
+}  // namespace typhon

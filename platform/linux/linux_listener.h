@@ -1,0 +1,56 @@
+#pragma once
+
+#include "platform/ipc.h"
+#include "platform/linux/bus_link.h"
+#include "platform/linux/ipc_context.h"
+#include "platform/linux/listening_sockets.h"
+
+#include <memory>
+#include <mutex>
+#include <string>
+
+namespace typhon {
+
+/// Accepts connections on a Unix socket. Any thread.
+class LinuxListener : public Listener, public std::enable_shared_from_this<LinuxListener> {
+public:
+    /// `name` is for messages; `role` is ours in the handshake of accepted connections.
+    LinuxListener(std::shared_ptr<IpcContext> context, std::string name, ListeningSocket socket,
+                  BusLink::Role role);
+    ~LinuxListener() override;
+
+    void setDelegate(std::weak_ptr<ListenerDelegate> delegate) override;
+    void resume() override;
+    void invalidate() override;
+    std::shared_ptr<ListenerEndpoint> endpoint() const override;
+
+private:
+    enum class Accepting { more, done, later };
+
+    void handleEvents();
+    Accepting acceptOne(int listening);
+    Accepting acceptFailed(int listening, int error);
+    void offer(FileDescriptor socket);
+    void arm();
+    void armLater();
+    void closeSocket();
+
+    const std::shared_ptr<IpcContext> context_;
+    const std::string name_;
+    const BusLink::Role role_;
+
+    mutable std::mutex mutex_;
+    // Below: protected by the mutex.
+    /// Shared with the thread that accepts. Null when there is none (any more).
+    std::shared_ptr<const ListeningSocket> socket_;
+    std::weak_ptr<ListenerDelegate> delegate_;
+    std::unique_ptr<EventPool::Watch> watch_;
+    std::unique_ptr<Timer> retry_;
+
+    // Below: used by the one thread that handles the watch.
+    /// Given up to accept, and close, a connection when there are no other descriptors left.
+    FileDescriptor reserve_;
+    bool shortageLogged_ = false;
+};
+
+}  // namespace typhon

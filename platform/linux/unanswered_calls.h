@@ -1,0 +1,59 @@
+#pragma once
+
+#include <cstddef>
+#include <memory>
+#include <mutex>
+#include <utility>
+
+namespace typhon {
+
+/// Counts the calls of one connection that somebody may still answer, and the memory they hold. Any thread.
+class UnansweredCalls : public std::enable_shared_from_this<UnansweredCalls> {
+public:
+    UnansweredCalls(unsigned maximumCount, std::size_t maximumMemory)
+        : maximumCount_(maximumCount), maximumMemory_(maximumMemory)
+    {}
+
+    /// Given back when the call is answered or dropped, whichever comes first.
+    class Charge {
+    public:
+        Charge(std::shared_ptr<UnansweredCalls> calls, std::size_t memory)
+            : calls_(std::move(calls)), memory_(memory)
+        {}
+        ~Charge() { calls_->release(memory_); }
+        Charge(const Charge&) = delete;
+        Charge& operator=(const Charge&) = delete;
+
+    private:
+        const std::shared_ptr<UnansweredCalls> calls_;
+        const std::size_t memory_;
+    };
+
+    /// Null when that is too much. A lone call may be as large as a message may.
+    std::unique_ptr<Charge> charge(std::size_t memory)
+    {
+        const std::lock_guard lock(mutex_);
+        if (count_ > 0 && (count_ >= maximumCount_ || memory_ + memory > maximumMemory_)) {
+            return nullptr;
+        }
+        ++count_;
+        memory_ += memory;
+        return std::make_unique<Charge>(shared_from_this(), memory);
+    }
+
+private:
+    void release(std::size_t memory)
+    {
+        const std::lock_guard lock(mutex_);
+        --count_;
+        memory_ -= memory;
+    }
+
+    const unsigned maximumCount_;
+    const std::size_t maximumMemory_;
+    std::mutex mutex_;
+    unsigned count_ = 0;
+    std::size_t memory_ = 0;
+};
+
+}  // namespace typhon
