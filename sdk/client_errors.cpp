@@ -69,7 +69,12 @@ ClientError clientError(std::string name, std::string message)
 
 ClientError systemError(int number, const std::string& what)
 {
-    return clientError(nameForErrorNumber(number), what + ": " + std::generic_category().message(number));
+    auto error =
+        clientError(nameForErrorNumber(number), what + ": " + std::generic_category().message(number));
+    if (error.name == ipc_errors::accessDenied) {
+        error.advice = "This user may not do that: check the permissions.";
+    }
+    return error;
 }
 
 }  // namespace typhon
