@@ -2,5 +2,5 @@
 
 int main(int argumentCount, char** arguments)
 {
-    return typhon::runCommandLine(argumentCount, arguments);
+    return typhon::runCommandLine({arguments + 1, arguments + argumentCount});
 }

@@ -15,7 +15,8 @@ ClientResult<PropertyList> readFrom(int descriptor, const std::string& name)
 {
     const auto reading = readPropertyListFromDescriptor(descriptor);
     if (!reading.value) {
-        return clientError(ipc_errors::failed, name + " is not a sound property list: " + reading.error);
+        return ClientError{ipc_errors::failed, name + " is not a sound property list: " + reading.error,
+                           "Name a file with an XML or binary property list."};
     }
     return *reading.value;
 }
@@ -30,7 +31,7 @@ ClientResult<PropertyList> readPropertyListFile(const std::string& path)
     const auto opened = openRegularFile(path);
     if (opened.error != 0) {
         auto error = systemError(opened.error, "cannot read " + path);
-        error.advice.clear();
+        error.advice = "Name a file that is there and that you may read.";
         return error;
     }
     return readFrom(opened.file.get(), path);

@@ -1,7 +1,6 @@
 #include "tools/sandbox_arguments.h"
 
 #include "platform/ipc.h"
-#include "sdk/client_errors.h"
 
 #include <algorithm>
 #include <array>
@@ -182,7 +181,8 @@ private:
         for (const auto& [source, destination] : request_.binds) {
             const auto folder = folderToReplace(placeOf(destination));
             if (host_.kind(source) == Kind::missing) {
-                return clientError(ipc_errors::invalidArguments, "there is no " + source + " to bind");
+                return ClientError{ipc_errors::invalidArguments, "there is no " + source + " to bind",
+                                   "Name a file or folder of the host."};
             }
             if (!folder.empty()) {
                 replaced_.insert(folder);
@@ -201,10 +201,10 @@ private:
     {
         const auto names = host_.names(folder);
         if (!names || names->size() > mostEntriesInReplacedFolder) {
-            const auto why = names ? " holds too many entries" : " cannot be listed";
-            return clientError(ipc_errors::invalidArguments, "nothing can be put into " + folder + ", which" +
-                                                                 why +
-                                                                 ": choose a destination outside of it");
+            return ClientError{ipc_errors::invalidArguments,
+                               "nothing can be put into " + folder + ", which " +
+                                   (names ? "holds too many entries" : "cannot be listed"),
+                               "Choose a destination outside of it."};
         }
         add({"--tmpfs", folder});
         for (const auto& name : *names) {

@@ -48,11 +48,13 @@ ClientResult<FileDescriptor> openExecutable(const std::string& path)
 {
     FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK));
     if (!file) {
-        return systemError(errno, "cannot open " + path);
+        auto error = systemError(errno, "cannot open " + path);
+        error.advice = "Name an executable file; a name without \"/\" is looked up in PATH.";
+        return error;
     }
     struct stat status {};
     if (::fstat(file.get(), &status) < 0 || !S_ISREG(status.st_mode)) {
-        return clientError(ipc_errors::invalidArguments, path + " is not a file");
+        return ClientError{ipc_errors::invalidArguments, path + " is not a file", "Name an executable file."};
     }
     if (::access(path.c_str(), X_OK) < 0) {
         return systemError(errno, "cannot execute " + path);
@@ -106,8 +108,9 @@ ClientResult<SandboxRequest> requestFor(const RootDirectory& root, const std::st
                            root.isScratch() ? host.resolved(root.directory()) : std::string()};
     for (const auto& [source, destination] : binds) {
         if (!destination.starts_with('/')) {
-            return clientError(ipc_errors::invalidArguments,
-                               "the destination " + destination + " of a bind is not an absolute path");
+            return ClientError{ipc_errors::invalidArguments,
+                               "the destination " + destination + " of a bind is not an absolute path",
+                               "Begin it with a \"/\"."};
         }
         request.binds.emplace_back(host.resolved(source),
                                    std::filesystem::path(destination).lexically_normal().string());

@@ -1,9 +1,13 @@
 #include "tools/commands/command.h"
 
+#include "platform/ipc.h"
 #include "platform/linux/visible_text.h"
+#include "sdk/client_errors.h"
 #include "sdk/service_socket.h"
+#include "tools/commands/program_words.h"
 #include "tools/property_list_json.h"
 
+#include <algorithm>
 #include <iostream>
 
 namespace typhon {
@@ -24,7 +28,9 @@ int fail(std::string_view message, std::string_view advice)
 
 int fail(const ClientError& error)
 {
-    return fail(error.message + " (" + error.name + ")", error.advice);
+    const bool saysMore = error.name != ipc_errors::failed && error.name != client_errors::fileNotFound &&
+                          error.name != client_errors::serviceUnknown;
+    return fail(saysMore ? error.message + " (" + error.name + ")" : error.message, error.advice);
 }
 
 int print(std::string_view text)
@@ -38,7 +44,32 @@ int printJson(const nlohmann::json& json)
     return print(jsonText(json) + "\n");
 }
 
-int runCommandLine(int argumentCount, const char* const* arguments)
+namespace {
+
+int failToParse(const CLI::App& parser, const CLI::ParseError& error)
+{
+    if (error.get_exit_code() == 0) {
+        return parser.exit(error, std::cout, std::cerr);
+    }
+    const auto rest = parser.remaining(true);
+    const bool isUnknown = !rest.empty() && parser.get_subcommands().empty();
+    fail(isUnknown ? "there is no command \"" + rest.front() + "\"" : std::string(error.what()),
+         "See typhonctl --help and typhonctl COMMAND --help.");
+    return exitUsage;
+}
+
+void addCommands(CLI::App& parser, Invocation& invocation)
+{
+    for (const auto add :
+         {addKeygenCommand, addTrustCommand, addSignCommand, addRunCommand, addCheckinCommand, addOpenCommand,
+          addLedgerCommand, addPreferencesCommand, addPlistCommand, addFontsCommand}) {
+        add(parser, invocation);
+    }
+}
+
+}  // namespace
+
+int runCommandLine(const std::vector<std::string>& words)
 {
     CLI::App parser{"Keys, signatures, sandboxes, check-ins and preferences of typhond", "typhonctl"};
     Invocation invocation;
@@ -48,15 +79,15 @@ int runCommandLine(int argumentCount, const char* const* arguments)
         ->type_name("DIR");
     parser.add_flag("--json", invocation.json, "Print JSON; data as base64");
     parser.require_subcommand(1);
-    for (const auto add :
-         {addKeygenCommand, addTrustCommand, addSignCommand, addRunCommand, addCheckinCommand, addOpenCommand,
-          addLedgerCommand, addPreferencesCommand, addPlistCommand, addFontsCommand}) {
-        add(parser, invocation);
-    }
+    addCommands(parser, invocation);
+    auto split = splitCommandLine(words);
+    invocation.program = std::move(split.program);
     try {
-        parser.parse(argumentCount, arguments);
+        // The parser takes the last word first.
+        std::reverse(split.own.begin(), split.own.end());
+        parser.parse(std::move(split.own));
     } catch (const CLI::ParseError& error) {
-        return parser.exit(error, std::cout, std::cerr) == 0 ? exitSuccess : exitUsage;
+        return failToParse(parser, error);
     }
     return invocation.exitCode;
 }

@@ -8,6 +8,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include <CLI/CLI.hpp>
 #include <nlohmann/json.hpp>
@@ -18,10 +19,12 @@ inline constexpr int exitSuccess = 0;
 inline constexpr int exitFailure = 1;
 inline constexpr int exitUsage = 2;
 
-/// What stands before the command on the command line, and the outcome of the command.
+/// What a command gets from the command line beside its own options, and its outcome.
 struct Invocation {
     std::optional<std::string> rootOption;
     bool json = false;
+    /// The program that "run" starts, and its arguments.
+    std::vector<std::string> program;
     int exitCode = exitSuccess;
 
     RootDirectory root() const;
@@ -62,7 +65,8 @@ void addPreferencesCommand(CLI::App& parser, Invocation& invocation);
 void addPlistCommand(CLI::App& parser, Invocation& invocation);
 void addFontsCommand(CLI::App& parser, Invocation& invocation);
 
-/// Parses a command line, runs its command and gives the program's exit code.
-int runCommandLine(int argumentCount, const char* const* arguments);
+/// Parses a command line (without the program's own name), runs its command and gives the program's exit
+/// code.
+int runCommandLine(const std::vector<std::string>& words);
 
 }  // namespace typhon

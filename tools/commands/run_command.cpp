@@ -12,44 +12,41 @@ struct Options {
     std::vector<std::pair<std::string, std::string>> binds;
 };
 
-int run(const Invocation& invocation, const Options& options, std::vector<std::string> words)
+int run(const Invocation& invocation, const Options& options)
 {
-    if (!words.empty() && words.front() == "--") {
-        words.erase(words.begin());
-    }
-    if (words.empty()) {
+    if (invocation.program.empty()) {
         fail("run needs an executable", "typhonctl run [--bind SRC DST]... [--] EXECUTABLE [ARG]...");
         return exitUsage;
     }
-    const auto executable = words.front();
-    words.erase(words.begin());
-    const auto outcome = runInSandbox(invocation.root(), executable, words, options.binds);
+    const std::vector<std::string> arguments(invocation.program.begin() + 1, invocation.program.end());
+    const auto outcome =
+        runInSandbox(invocation.root(), invocation.program.front(), arguments, options.binds);
     return outcome ? *outcome : fail(outcome.error());
 }
 
-}  // namespace
-
-// What follows the first word that is no option of "run" belongs to the program, whatever it looks like.
-void addRunCommand(CLI::App& parser, Invocation& invocation)
+void declare(CLI::App& command, Options& options)
 {
-    auto options = std::make_shared<Options>();
-    CLI::App& command =
-        *parser.add_subcommand("run", "Run a program in a sandbox, under its signed identity");
-    command.footer(
-        "EXECUTABLE [ARG]... follow, after an optional \"--\". The program sees the host read-only, without "
-        "the font files, the network, /run and /tmp, but with typhon's sockets. Standard input and output "
-        "are passed through, and so are the exit status and signals.");
     command
         .add_option(
-            "--bind", options->binds,
+            "--bind", options.binds,
             "Put SRC of the host at DST in the sandbox, which need not exist on the host; the program "
             "may write to it where you may (repeatable)")
         ->allow_extra_args(false)
         ->type_name("SRC DST");
-    command.prefix_command();
-    command.callback([&invocation, options, &command] {
-        invocation.exitCode = run(invocation, *options, command.remaining());
-    });
+    // Shown by --help only: the words were taken off the command line before it is parsed.
+    command.add_option("program", "What to run; all that follows it is its own")
+        ->type_name("EXECUTABLE [ARG]...");
+    command.footer("The program sees the host read-only, without the font files, the network, /run and /tmp, "
+                   "but with typhon's sockets. Standard input and output are passed through, and so are the "
+                   "exit status and signals.");
+}
+
+}  // namespace
+
+void addRunCommand(CLI::App& parser, Invocation& invocation)
+{
+    addCommand<Options>(parser, invocation, "run", "Run a program in a sandbox, under its signed identity",
+                        run, declare);
 }
 
 }  // namespace typhon

@@ -1,0 +1,230 @@
+#include "faces_in_file.h"
+#include "platform/linux/visible_text.h"
+#include "sdk/typhon_client.h"
+
+#include <iostream>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include <fcntl.h>
+
+// A small application of typhon, built once for each identifier, so that each is an executable of its own and
+// can be signed as such. It shows what an application gets to see, and uses nothing but libtyphon.
+
+namespace typhon::sample {
+
+namespace {
+
+constexpr std::string_view identifier = TYPHON_SAMPLE_IDENTIFIER;
+constexpr const char* usage = R"(A sample application of typhon.
+
+  checkin           what it sees, one line a face, and which extensions it got
+  read              open every font it sees through its grant and read its names from the descriptor
+  try PATH          try to get at a file that was not granted, in every way it has; 0 when all are refused
+  reset IDENTIFIER  ask the daemon to forget the fonts issued to an application
+
+The system is that of the folder $TYPHON_ROOT, else of this machine.
+)";
+
+using View = std::optional<PropertyList>;
+
+int complain(const ClientError& error)
+{
+    std::cerr << identifier << ": " << visibleText(error.message) << " (" << error.name << ")\n";
+    if (!error.advice.empty()) {
+        std::cerr << "  " << error.advice << "\n";
+    }
+    return 1;
+}
+
+bool isFontPicker()
+{
+    return identifier == "com.vorlan.Panekit.FontPicker";
+}
+
+ClientResult<View> checkIn(TyphonClient& client)
+{
+    return isFontPicker() ? client.checkinForFontPicker() : client.checkin();
+}
+
+PropertyList::Dictionary fontsIn(const PropertyList& view)
+{
+    const auto* fonts = view.find("fontsInfo");
+    return fonts == nullptr || fonts->asDictionary() == nullptr ? PropertyList::Dictionary{}
+                                                                : *fonts->asDictionary();
+}
+
+void printFont(const std::string& path, const PropertyList& entry)
+{
+    const char* token = entry.find("data") == nullptr ? "" : "  [own token]";
+    const auto* names = entry.find("familyName");
+    const auto* faces = names == nullptr ? nullptr : names->asDictionary();
+    for (const auto& [postScriptName, family] : faces == nullptr ? PropertyList::Dictionary{} : *faces) {
+        const auto* text = family.asString();
+        std::cout << "  " << visibleText(text == nullptr ? "-" : *text) << " / "
+                  << visibleText(postScriptName) << "  " << visibleText(path) << token << "\n";
+    }
+}
+
+void printExtensions(const PropertyList& view)
+{
+    std::cout << "  extensions:";
+    const char* separator = " ";
+    for (const char* key : {"extension", "extension.fontasset", "extension.provider"}) {
+        if (view.find(key) != nullptr) {
+            std::cout << std::exchange(separator, ", ") << key;
+        }
+    }
+    std::cout << (*separator == ' ' ? " none\n" : "\n");
+    if (view.find("hide-profilefonts") != nullptr) {
+        std::cout << "  profile fonts are hidden from it\n";
+    }
+}
+
+int showCheckin(TyphonClient& client)
+{
+    const auto view = checkIn(client);
+    if (!view) {
+        return complain(view.error());
+    }
+    if (!*view) {
+        std::cout << identifier << " has no share in the fonts (the answer is null)\n";
+        return 0;
+    }
+    const auto fonts = fontsIn(**view);
+    std::cout << identifier << " sees " << fonts.size() << " font files\n";
+    for (const auto& [path, entry] : fonts) {
+        printFont(path, entry);
+    }
+    printExtensions(**view);
+    return 0;
+}
+
+/// True when the file could be opened and is a font.
+bool readFont(TyphonClient& client, const std::string& path)
+{
+    const auto file = client.openFont(path);
+    if (!file) {
+        complain(file.error());
+        return false;
+    }
+    const auto faces = facesInFile(file->get());
+    for (const auto& face : faces) {
+        std::cout << "  " << visibleText(face.familyName) << " / " << visibleText(face.postScriptName)
+                  << "\n";
+    }
+    return !faces.empty();
+}
+
+int readFonts(TyphonClient& client)
+{
+    const auto view = checkIn(client);
+    if (!view) {
+        return complain(view.error());
+    }
+    std::size_t read = 0;
+    const auto fonts = fontsIn(view->value_or(PropertyList()));
+    for (const auto& [path, entry] : fonts) {
+        read += readFont(client, path) ? 1 : 0;
+    }
+    std::cout << identifier << " read " << read << " of " << fonts.size()
+              << " font files, each from the descriptor it was given\n";
+    return read == fonts.size() ? 0 : 1;
+}
+
+/// Every token of a check-in, with the name it goes by; the empty one first.
+std::vector<std::pair<std::string, Data>> tokensIn(const PropertyList& view)
+{
+    std::vector<std::pair<std::string, Data>> tokens{{"no token", {}}};
+    for (const char* key : {"extension", "extension.fontasset", "extension.provider"}) {
+        const auto* token = view.find(key);
+        if (token != nullptr && token->asData() != nullptr) {
+            tokens.emplace_back(key, *token->asData());
+        }
+    }
+    for (const auto& [path, entry] : fontsIn(view)) {
+        const auto* token = entry.find("data");
+        if (token != nullptr && token->asData() != nullptr) {
+            tokens.emplace_back("the token of " + path, *token->asData());
+        }
+    }
+    return tokens;
+}
+
+bool isRefusedToItself(const RootDirectory& root, const std::string& path)
+{
+    const FileDescriptor file(::open(root.real(path).c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+    std::cout << "  opened by itself: " << (file ? "IT COULD" : "refused") << "\n";
+    return !file;
+}
+
+bool isRefused(TyphonClient& client, const std::string& path, const std::string& name, const Data& token)
+{
+    const auto file = client.redeem(token, path);
+    std::cout << "  with " << visibleText(name) << ": "
+              << (file ? std::string("IT COULD")
+                       : "refused, " + file.error().name + ": " + visibleText(file.error().message))
+              << "\n";
+    return !file;
+}
+
+int tryFile(TyphonClient& client, const std::string& path)
+{
+    const auto view = checkIn(client);
+    if (!view) {
+        return complain(view.error());
+    }
+    std::cout << identifier << " tries to get " << visibleText(path) << "\n";
+    bool allRefused = isRefusedToItself(client.root(), path);
+    for (const auto& [name, token] : tokensIn(view->value_or(PropertyList()))) {
+        allRefused = isRefused(client, path, name, token) && allRefused;
+    }
+    return allRefused ? 0 : 1;
+}
+
+int reset(TyphonClient& client, const std::string& application)
+{
+    const auto outcome = client.resetIssuedFontsFor(application);
+    if (!outcome) {
+        return complain(outcome.error());
+    }
+    std::cout << identifier << " asked to forget what was issued to " << visibleText(application)
+              << "; the daemon answered\n";
+    return 0;
+}
+
+int runCommand(const std::vector<std::string>& words)
+{
+    const auto is = [&](std::string_view command, std::size_t count) {
+        return words.size() == count && words.front() == command;
+    };
+    if (is("--help", 1) || is("help", 1)) {
+        std::cout << usage;
+        return 0;
+    }
+    if (!is("checkin", 1) && !is("read", 1) && !is("try", 2) && !is("reset", 2)) {
+        std::cerr << usage;
+        return 2;
+    }
+    auto client = TyphonClient::connect();
+    if (!client) {
+        return complain(client.error());
+    }
+    if (words.front() == "checkin") {
+        return showCheckin(*client);
+    }
+    if (words.front() == "read") {
+        return readFonts(*client);
+    }
+    return words.front() == "try" ? tryFile(*client, words[1]) : reset(*client, words[1]);
+}
+
+}  // namespace
+
+}  // namespace typhon::sample
+
+int main(int argumentCount, char** arguments)
+{
+    return typhon::sample::runCommand({arguments + 1, arguments + argumentCount});
+}
