@@ -8,11 +8,7 @@ std::optional<CodeSigningTask> SimulatedCodeSigning::taskFromAuditToken(const Au
     if (!process) {
         return std::nullopt;
     }
-    CodeSigningTask task{std::move(process->signingIdentifier), {}};
-    if (task.signingIdentifier) {
-        task.entitlements = std::move(process->entitlements);
-    }
-    return task;
+    return CodeSigningTask{std::move(process->signingIdentifier), std::move(process->entitlements)};
 }
 
 }  // namespace typhon

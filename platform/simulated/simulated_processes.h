@@ -14,12 +14,13 @@ namespace typhon {
 
 /// What a test says about one process.
 struct SimulatedProcess {
-    /// Null for a process without a valid signature.
-    std::optional<std::string> signingIdentifier;
-    PropertyList::Dictionary entitlements;
+    /// Null for a process without a valid signature (then without entitlements), and for a signature that
+    /// names nobody.
+    std::optional<std::string> signingIdentifier = std::nullopt;
+    PropertyList::Dictionary entitlements = {};
     bool isSandboxed = true;
     /// Logical paths that it can read by itself: the file or directory itself, nothing beneath it.
-    std::set<std::string> readablePaths;
+    std::set<std::string> readablePaths = {};
     /// False to let the issuing of read extensions fail.
     bool acceptsExtensions = true;
 };
