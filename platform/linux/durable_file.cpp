@@ -54,6 +54,7 @@ std::optional<std::string> writeNewFile(const std::string& path, std::span<const
 std::optional<std::string> makeDirectory(const std::string& path, mode_t permissions)
 {
     if (::mkdir(path.c_str(), permissions) == 0) {
+        ::chmod(path.c_str(), permissions);
         giveToOwnerOfDirectory(path);
         return flushDirectory(directoryOf(path));
     }

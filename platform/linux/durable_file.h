@@ -29,7 +29,8 @@ private:
 
 /// The functions below return null, or why they failed.
 
-/// Creates a directory and those above it, with these permissions (as the umask allows), flushed to disk.
+/// Creates a directory and those above it, with these permissions whatever the umask, flushed to
+/// disk.
 std::optional<std::string> makeDirectories(const std::string& path, mode_t permissions);
 
 /// Makes `path` a file with these contents and permissions in one step that a crash or power cut cannot

@@ -88,6 +88,19 @@ TEST(MakeDirectories, MakesThoseAboveAndAcceptsThoseThere)
     EXPECT_THAT(makeDirectories(scratch.real("/a/file/d"), 0755).value_or(""), HasSubstr("/a/file"));
 }
 
+TEST(MakeDirectories, GivesThePermissionsAskedForWhateverTheUmask)
+{
+    const ScratchDirectory scratch;
+    const mode_t before = ::umask(0077);
+    EXPECT_EQ(makeDirectories(scratch.real("/a/b"), 0755), std::nullopt);
+    ::umask(before);
+    for (const char* name : {"/a", "/a/b"}) {
+        struct stat status {};
+        ASSERT_EQ(::stat(scratch.real(name).c_str(), &status), 0);
+        EXPECT_EQ(status.st_mode & 07777, 0755u) << name;
+    }
+}
+
 TEST(FileLock, KeepsOthersOutWithinItsPatience)
 {
     const ScratchDirectory scratch;

@@ -9,6 +9,8 @@
 #include <fmt/format.h>
 #include <sys/stat.h>
 #include <sys/uio.h>
+// Every message would carry the same place in this file.
+#define SD_JOURNAL_SUPPRESS_LOCATION
 #include <systemd/sd-journal.h>
 
 // One message is one line and one write, so that the lines of several threads and processes do not mix. The

@@ -53,7 +53,10 @@ OpenedFile openRegularFile(const std::string& path, int directory, std::uint64_t
     }
     const auto same = "/proc/self/fd/" + std::to_string(found.get());
     opened.file = FileDescriptor(::open(same.c_str(), O_RDONLY | O_CLOEXEC));
-    opened.error = opened.file ? 0 : errno;
+    if (!opened.file) {
+        // Without /proc there seems to be no such file; but there is, and nobody may take it for absent.
+        opened.error = errno == ENOENT ? EIO : errno;
+    }
     return opened;
 }
 

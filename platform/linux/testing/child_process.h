@@ -9,6 +9,7 @@
 #include <array>
 #include <csignal>
 #include <cstdlib>
+#include <fstream>
 #include <functional>
 #include <stdexcept>
 #include <string>
@@ -81,6 +82,26 @@ public:
 
     /// The child's token, as it is now.
     AuditToken token() const { return tokenOfProcess(pidfd_.get()); }
+
+    /// The token of the innermost descendant: of what runs inside a sandbox, once it has answered.
+    AuditToken tokenInside() const
+    {
+        pid_t inside = pid_;
+        for (pid_t next = inside; next > 0; next = firstChildOf(inside)) {
+            inside = next;
+        }
+        const auto pidfd = openPidfd(inside);
+        return tokenOfProcess(pidfd.get());
+    }
+
+    /// The first child of a process, or 0.
+    static pid_t firstChildOf(pid_t parent)
+    {
+        const auto number = std::to_string(parent);
+        pid_t child = 0;
+        std::ifstream("/proc/" + number + "/task/" + number + "/children") >> child;
+        return child;
+    }
 
     void write(const std::string& text) const
     {
