@@ -63,6 +63,7 @@ std::optional<FileCredentials> parse(std::string_view status)
     return credentials;
 }
 
+/// What the daemon itself does not hold it cannot lend: the answer is then that of the plain permissions.
 bool setReadOverrides(std::uint64_t overrides)
 {
     __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
@@ -70,7 +71,7 @@ bool setReadOverrides(std::uint64_t overrides)
     if (::syscall(SYS_capget, &header, sets.data()) != 0) {
         return false;
     }
-    const auto wanted = static_cast<std::uint32_t>(overrides);
+    const auto wanted = static_cast<std::uint32_t>(overrides) & sets[0].permitted;
     sets[0].effective = (sets[0].effective & ~static_cast<std::uint32_t>(readOverrides)) | wanted;
     return ::syscall(SYS_capset, &header, sets.data()) == 0;
 }
