@@ -146,7 +146,12 @@ std::optional<std::string> writeKeyFiles(const std::string& path, const SigningK
     if (auto error = writeNewFile(path, encodeSigningKey(key), 0600)) {
         return error;
     }
-    return writeNewFile(path + ".pub", encodePublicKey(key.publicKey), 0644);
+    auto error = writeNewFile(path + ".pub", encodePublicKey(key.publicKey), 0644);
+    if (error) {
+        // A secret key without its public one would be in the way of the next try.
+        ::unlink(path.c_str());
+    }
+    return error;
 }
 
 Result<SigningKey> readSigningKeyFile(const std::string& path)
