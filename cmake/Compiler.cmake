@@ -6,6 +6,7 @@ set(CMAKE_POSITION_INDEPENDENT_CODE ON)
 
 set(TYPHON_SANITIZE "" CACHE STRING "Sanitizers to build with, as for -fsanitize=")
 option(TYPHON_FUZZ "Build the fuzzers (needs clang)" OFF)
+option(TYPHON_BENCH "Build the benchmarks" OFF)
 
 add_compile_options(-Wall -Wextra -Wpedantic -Wshadow -Wconversion -Wnon-virtual-dtor -Woverloaded-virtual -Werror)
 add_compile_definitions(_GNU_SOURCE)

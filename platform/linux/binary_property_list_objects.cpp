@@ -4,14 +4,25 @@
 #include "platform/linux/unicode.h"
 
 #include <bit>
+#include <cstring>
 #include <string_view>
 #include <utility>
+
+#include <endian.h>
 
 namespace typhon {
 namespace {
 
 std::uint64_t bigEndian(std::span<const std::uint8_t> bytes)
 {
+    // What files really have, and what reading them spends its time with.
+    if (bytes.size() == 2)
+        return static_cast<std::uint64_t>(bytes[0] << 8 | bytes[1]);
+    if (bytes.size() == 4) {
+        std::uint32_t value = 0;
+        std::memcpy(&value, bytes.data(), sizeof value);
+        return be32toh(value);
+    }
     std::uint64_t value = 0;
     for (const auto byte : bytes)
         value = value << 8 | byte;
@@ -142,9 +153,10 @@ std::optional<PropertyList> BinaryPropertyListObjects::scalar(const Head& head)
     case BinaryObjectType::data:
         return data(head);
     case BinaryObjectType::ascii:
-        return ascii(head);
     case BinaryObjectType::utf16:
-        return utf16(head);
+        if (auto string = text(head))
+            return std::move(*string);
+        return std::nullopt;
     default:
         refuse("an object of a kind that is not supported", head.offset);
         return std::nullopt;
@@ -211,27 +223,32 @@ std::optional<PropertyList> BinaryPropertyListObjects::data(const Head& head)
     return Data{{bytes->begin(), bytes->end()}};
 }
 
-std::optional<PropertyList> BinaryPropertyListObjects::ascii(const Head& head)
+std::optional<std::string> BinaryPropertyListObjects::text(const Head& head)
+{
+    return head.type == BinaryObjectType::ascii ? ascii(head) : utf16(head);
+}
+
+std::optional<std::string> BinaryPropertyListObjects::ascii(const Head& head)
 {
     const auto bytes = contents(head.contents, head.count);
     if (!bytes)
         return std::nullopt;
     const std::string_view text(reinterpret_cast<const char*>(bytes->data()), bytes->size());
     if (isAscii(text))
-        return text;
+        return std::string(text);
     refuse("text that is not ASCII", head.offset);
     return std::nullopt;
 }
 
-std::optional<PropertyList> BinaryPropertyListObjects::utf16(const Head& head)
+std::optional<std::string> BinaryPropertyListObjects::utf16(const Head& head)
 {
     const auto bytes = contents(head.contents, head.count * 2);
     if (!bytes)
         return std::nullopt;
-    if (auto text = utf8FromUtf16BigEndian(*bytes))
-        return std::move(*text);
-    refuse("text that is not valid UTF-16", head.offset);
-    return std::nullopt;
+    auto text = utf8FromUtf16BigEndian(*bytes);
+    if (!text)
+        refuse("text that is not valid UTF-16", head.offset);
+    return text;
 }
 
 }  // namespace typhon

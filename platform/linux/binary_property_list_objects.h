@@ -74,6 +74,9 @@ public:
     /// The value of an object that is no container.
     std::optional<PropertyList> scalar(const Head& head);
 
+    /// The text of a string.
+    std::optional<std::string> text(const Head& head);
+
     /// Records the first reason; always false.
     bool refuse(const char* reason, std::size_t offset);
     const std::string& error() const noexcept { return error_; }
@@ -89,8 +92,8 @@ private:
     std::optional<double> real(const Head& head);
     std::optional<PropertyList> date(const Head& head);
     std::optional<PropertyList> data(const Head& head);
-    std::optional<PropertyList> ascii(const Head& head);
-    std::optional<PropertyList> utf16(const Head& head);
+    std::optional<std::string> ascii(const Head& head);
+    std::optional<std::string> utf16(const Head& head);
     std::optional<PropertyList> constant(const Head& head);
 
     const Bytes bytes_;

@@ -9,7 +9,9 @@
 
 #include <algorithm>
 #include <limits>
+#include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace typhon {
@@ -61,7 +63,7 @@ private:
     bool openContainer(std::size_t object, const Head& head, std::size_t referrer);
     bool readNextElement();
     bool addToInnermost(const Finished& element);
-    const PropertyList* readKey(const OpenContainer& dictionary);
+    std::optional<std::string> readKey(const OpenContainer& dictionary);
     bool closeContainer();
     const Finished& finish(std::size_t object, PropertyList value, const Weight& weight);
     const Finished* finished(std::size_t object) const;
@@ -168,43 +170,44 @@ bool BinaryPropertyListReader::addToInnermost(const Finished& element)
         ++container.size;
         return true;
     }
-    // Reading the key may move `element`.
-    PropertyList value = element.value;
-    const auto* key = readKey(container);
-    if (key == nullptr)
+    auto key = readKey(container);
+    if (!key)
         return false;
+    // The end is the right place when keys are sorted, as most writers do.
     auto& dictionary = container.dictionary;
-    dictionary.try_emplace(dictionary.end(), *key->asString(), std::move(value));
+    dictionary.emplace_hint(dictionary.end(), std::move(*key), element.value);
     if (dictionary.size() == container.size)
         return objects_.refuse("a duplicate key", objects_.referenceOffset(container.head, container.size));
     ++container.size;
     return true;
 }
 
-/// The key of the next element.
-const PropertyList* BinaryPropertyListReader::readKey(const OpenContainer& dictionary)
+/// The key of the next element. Keys are not kept as values: most occur once, and the others are short.
+std::optional<std::string> BinaryPropertyListReader::readKey(const OpenContainer& dictionary)
 {
     const auto object = objects_.reference(dictionary.head, dictionary.size);
     const auto head = object ? objects_.head(*object) : std::nullopt;
     if (!head)
-        return nullptr;
+        return std::nullopt;
     const auto offset = objects_.referenceOffset(dictionary.head, dictionary.size);
     if (!head->isString()) {
         objects_.refuse("a key that is not a string", offset);
-        return nullptr;
+        return std::nullopt;
     }
-    return visit(*object, offset) ? &finished(*object)->value : nullptr;
+    auto key = objects_.text(*head);
+    return key && charge({1, key->size(), 0}, offset) ? std::move(key) : std::nullopt;
 }
 
 bool BinaryPropertyListReader::closeContainer()
 {
-    auto container = std::move(open_.back());
-    open_.pop_back();
+    auto& container = open_.back();
+    const auto object = container.object;
     const Weight weight{total_.values - container.before.values, total_.bytes - container.before.bytes,
                         container.height};
     auto value = container.isDictionary() ? PropertyList(std::move(container.dictionary))
                                           : PropertyList(std::move(container.array));
-    const auto& element = finish(container.object, std::move(value), weight);
+    open_.pop_back();
+    const auto& element = finish(object, std::move(value), weight);
     return open_.empty() || addToInnermost(element);
 }
 
@@ -215,6 +218,8 @@ bool BinaryPropertyListReader::readAll()
     if (!objects_.readTrailer(std::min(limits_.values, mostObjects)))
         return false;
     states_.assign(objects_.count(), unread);
+    constexpr std::size_t mostReserved = 1u << 16;
+    finished_.reserve(std::min(objects_.count(), mostReserved));
     if (!visit(objects_.top(), 0))
         return false;
     while (!open_.empty()) {

@@ -62,7 +62,7 @@ const char* PropertyListBuilder::add(PropertyList value)
     // Most writers sort their keys, so the end is the right place more often than not.
     auto& dictionary = container.dictionary;
     const auto size = dictionary.size();
-    dictionary.try_emplace(dictionary.end(), std::move(container.key), std::move(value));
+    dictionary.emplace_hint(dictionary.end(), std::move(container.key), std::move(value));
     container.hasKey = false;
     return dictionary.size() == size ? "a duplicate key" : nullptr;
 }

@@ -8,7 +8,6 @@
 #include "platform/linux/property_list_text.h"
 
 #include <algorithm>
-#include <array>
 #include <new>
 #include <utility>
 
@@ -88,24 +87,29 @@ XmlPropertyListReader::XmlPropertyListReader(const PropertyListLimits& limits)
 
 XmlPropertyListReader::Element XmlPropertyListReader::elementNamed(std::string_view name)
 {
-    static constexpr std::array<std::pair<std::string_view, Element>, 11> elements{{
-        {"key", Element::key},
-        {"string", Element::string},
-        {"dict", Element::dict},
-        {"true", Element::yes},
-        {"false", Element::no},
-        {"array", Element::array},
-        {"integer", Element::integer},
-        {"real", Element::real},
-        {"data", Element::data},
-        {"date", Element::date},
-        {"plist", Element::plist},
-    }};
-    for (const auto& [candidate, element] : elements) {
-        if (candidate == name)
-            return element;
+    // By length first: this is asked once for every element.
+    switch (name.size()) {
+    case 3:
+        return name == "key" ? Element::key : Element::none;
+    case 4:
+        return name == "dict"   ? Element::dict
+               : name == "true" ? Element::yes
+               : name == "real" ? Element::real
+               : name == "data" ? Element::data
+               : name == "date" ? Element::date
+                                : Element::none;
+    case 5:
+        return name == "false"   ? Element::no
+               : name == "array" ? Element::array
+               : name == "plist" ? Element::plist
+                                 : Element::none;
+    case 6:
+        return name == "string" ? Element::string : Element::none;
+    case 7:
+        return name == "integer" ? Element::integer : Element::none;
+    default:
+        return Element::none;
     }
-    return Element::none;
 }
 
 void XmlPropertyListReader::start(std::string_view name)
