@@ -91,6 +91,9 @@ ClientResult<Done> registerSandbox(ServiceConnection& service, const SandboxProc
     if (!outcome) {
         auto error = outcome.error();
         error.message = "typhond did not take the sandbox: " + error.message;
+        if (error.name == ipc_errors::accessDenied) {
+            error.advice = "Only a program outside of any sandbox may start one; see typhond's log.";
+        }
         return error;
     }
     return Done{};

@@ -187,10 +187,12 @@ SandboxProcess::~SandboxProcess()
     if (bubblewrap_ < 0) {
         return;
     }
-    if (firstProcess_) {
-        ::syscall(SYS_pidfd_send_signal, firstProcess_.get(), SIGKILL, nullptr, 0);
+    // Bubblewrap ends with the first process and reaps it, so that nothing is left to anybody else.
+    const bool isTold =
+        firstProcess_ && ::syscall(SYS_pidfd_send_signal, firstProcess_.get(), SIGKILL, nullptr, 0) == 0;
+    if (!isTold) {
+        ::kill(bubblewrap_, SIGKILL);
     }
-    ::kill(bubblewrap_, SIGKILL);
     statusOf(bubblewrap_, 0);
 }
 
