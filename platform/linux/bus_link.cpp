@@ -13,11 +13,14 @@
 #include <cstring>
 #include <utility>
 
-#include <sys/epoll.h>
+#include <sys/socket.h>
 
 namespace typhon {
 
 namespace {
+
+/// Bytes; what the kernel gives by default.
+constexpr int sendBuffer = 212992;
 
 const IpcError disconnectedError{ipc_errors::disconnected, "the connection is gone"};
 
@@ -100,6 +103,8 @@ int BusLink::open()
     sd_bus_add_filter(bus_, nullptr, sawMessage, this);
     result = sd_bus_start(bus_);
     if (result >= 0) {
+        // Where privileges allow, sd-bus enlarges it a hundredfold, and each peer could leave that unread.
+        ::setsockopt(descriptor, SOL_SOCKET, SO_SNDBUF, &sendBuffer, sizeof sendBuffer);
         watch_ = context_->pool.watch(descriptor, [weak = weak_from_this()](std::uint32_t) {
             if (const auto self = weak.lock()) {
                 self->handleEvents();

@@ -1,0 +1,265 @@
+// What a peer may cost, and what becomes of one that costs more.
+
+#include "platform/linux/memory_file.h"
+#include "platform/linux/property_list_writer.h"
+#include "testing/ipc_service.h"
+#include "testing/wire_message.h"
+
+#include <algorithm>
+
+#include <fcntl.h>
+#include <sys/resource.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+
+namespace typhon {
+namespace {
+
+TEST(LinuxIpcLimits, AHandshakeMustEndInTime)
+{
+    IpcLimits limits;
+    limits.handshake = std::chrono::milliseconds(50);
+    TestedService service(limits);
+    ForeignClient finished(service.path());
+    ASSERT_TRUE(finished.isAlive());
+    const auto silent = rawConnection(service.path());
+    const auto partial = rawConnection(service.path());
+    write(partial, std::string(1, '\0') + "AUTH EXTE");
+    EXPECT_TRUE(isClosedByPeer(silent.get()));
+    EXPECT_TRUE(isClosedByPeer(partial.get()));
+    EXPECT_TRUE(service.log.waitFor("did not finish the handshake in time", 2));
+    EXPECT_TRUE(finished.isAlive());
+}
+
+TEST(LinuxIpcLimits, HalfAMessageHurtsNobodyElse)
+{
+    TestedService service;
+    ForeignClient other(service.path());
+    {
+        const auto socket = rawConnection(service.path());
+        const std::string text = "never whole";
+        const auto message = WireMessage::call(1, testedInterface, "note", &text);
+        write(socket, pipelinedHandshake() + message.substr(0, message.size() / 2));
+        EXPECT_TRUE(other.isAlive());
+    }
+    EXPECT_TRUE(other.isAlive());
+    EXPECT_EQ(service.log.countContaining("never whole"), 0U);
+}
+
+TEST(LinuxIpcLimits, GarbageEndsTheConnectionOnly)
+{
+    TestedService service;
+    ForeignClient other(service.path());
+    const auto early = rawConnection(service.path());
+    write(early, "GET / HTTP/1.1\r\n\r\n");
+    EXPECT_TRUE(isClosedByPeer(early.get()));
+    const auto late = rawConnection(service.path());
+    write(late, pipelinedHandshake() + std::string(64, '\xAA'));
+    EXPECT_TRUE(isClosedByPeer(late.get()));
+    EXPECT_TRUE(other.isAlive());
+}
+
+TEST(LinuxIpcLimits, AMessageIsLimitedInSize)
+{
+    IpcLimits limits;
+    limits.message.bytes = 64U << 10;
+    TestedService service(limits);
+    ForeignClient fits(service.path());
+    EXPECT_EQ(fits.callText("echo", std::string(60U << 10, 'x')), "");
+    EXPECT_NE(fits.callText("echo", std::string(80U << 10, 'x')), "");
+    EXPECT_TRUE(service.log.waitFor("too large"));
+    // Its beginning is enough.
+    const auto socket = rawConnection(service.path());
+    const std::string small = "small";
+    const std::string large(200U << 10, 'x');
+    write(socket, pipelinedHandshake() + WireMessage::call(1, testedInterface, "note", &small));
+    ASSERT_TRUE(service.log.waitFor("noted small"));
+    write(socket, WireMessage::call(2, testedInterface, "note", &small));
+    ASSERT_TRUE(service.log.waitFor("noted small", 2));
+    write(socket, WireMessage::call(3, testedInterface, "note", &large).substr(0, 16));
+    EXPECT_TRUE(isClosedByPeer(socket.get()));
+}
+
+TEST(LinuxIpcLimits, ASplitMessageIsLimitedInSize)
+{
+    IpcLimits limits;
+    limits.message.bytes = 64U << 10;
+    TestedService service(limits);
+    const auto socket = rawConnection(service.path());
+    const std::string large(200U << 10, 'x');
+    const auto message = WireMessage::call(1, testedInterface, "note", &large);
+    write(socket, pipelinedHandshake() + message.substr(0, 5));
+    for (std::size_t offset = 5; offset < message.size(); offset += 4096) {
+        const auto part = std::string_view(message).substr(offset, 4096);
+        if (::send(socket.get(), part.data(), part.size(), MSG_NOSIGNAL) < 0) {
+            break;
+        }
+    }
+    EXPECT_TRUE(isClosedByPeer(socket.get()));
+    EXPECT_EQ(service.log.countContaining("noted"), 0U);
+}
+
+TEST(LinuxIpcLimits, UnansweredCallsAreLimited)
+{
+    IpcLimits limits;
+    limits.unansweredCalls = 3;
+    TestedService service(limits);
+    ForeignClient client(service.path());
+    for (int times = 0; times < 5; ++times) {
+        // Dropped by the service: nobody is left who could answer, so they do not count.
+        client.start("never");
+    }
+    for (int times = 0; times < 3; ++times) {
+        client.start("hold");
+    }
+    EXPECT_EQ(client.call("hold"), ipc_errors::limitsExceeded);
+    EXPECT_EQ(client.callText("echo", "x"), ipc_errors::limitsExceeded);
+    EXPECT_EQ(service.log.countContaining("too many unanswered calls"), 1U);
+    ForeignClient other(service.path());
+    EXPECT_TRUE(other.isAlive());
+    service.delegate->object->release();
+    EXPECT_TRUE(client.isAlive());
+}
+
+TEST(LinuxIpcLimits, ConnectionsOfAProcessAreLimited)
+{
+    IpcLimits limits;
+    limits.connectionsPerProcess = 2;
+    TestedService service(limits);
+    ForeignClient first(service.path());
+    auto second = std::make_unique<ForeignClient>(service.path());
+    ASSERT_TRUE(first.isAlive());
+    ASSERT_TRUE(second->isAlive());
+    for (int times = 0; times < 3; ++times) {
+        EXPECT_TRUE(isClosedByPeer(rawConnection(service.path()).get()));
+    }
+    EXPECT_EQ(service.log.countContaining("connections; further ones are refused"), 1U);
+    EXPECT_TRUE(first.isAlive());
+    second.reset();
+    // The place is free as soon as the service has seen the end of the second.
+    for (int times = 0; times < 1000; ++times) {
+        ForeignClient third(service.path());
+        if (third.isAlive()) {
+            return;
+        }
+    }
+    FAIL() << "the place of a closed connection stays taken";
+}
+
+TEST(LinuxIpcLimits, WhatAPeerLeavesUnreadIsLimited)
+{
+    IpcLimits limits;
+    limits.queuedBytes = 256U << 10;
+    limits.unansweredCalls = 1000;
+    TestedService service(limits);
+    PropertyList::Dictionary view;
+    for (int number = 0; number < 50; ++number) {
+        view.emplace(std::to_string(number), std::string(1000, 'x'));
+    }
+    service.delegate->object->view = PropertyList(view);
+    const auto socket = rawConnection(service.path());
+    std::string bytes = pipelinedHandshake();
+    write(socket, bytes);
+    for (std::uint32_t serial = 1; serial <= 300; ++serial) {
+        const auto call = WireMessage::call(serial, testedInterface, "view");
+        if (::send(socket.get(), call.data(), call.size(), MSG_NOSIGNAL) < 0) {
+            break;
+        }
+    }
+    EXPECT_TRUE(service.log.waitFor("bytes unread"));
+    ForeignClient other(service.path());
+    EXPECT_TRUE(other.isAlive());
+}
+
+TEST(LinuxIpcLimits, DescriptorsThatAPeerLeavesUnreadAreLimited)
+{
+    IpcLimits limits;
+    limits.unreadDescriptors = 5;
+    TestedService service(limits);
+    service.delegate->object->view =
+        PropertyList(PropertyList::Dictionary{{"large", PropertyList(std::string(100000, 'x'))}});
+    ForeignClient reads(service.path());
+    for (int times = 0; times < 20; ++times) {
+        ASSERT_EQ(reads.call("view"), "");
+    }
+    const auto socket = rawConnection(service.path());
+    write(socket, pipelinedHandshake());
+    for (std::uint32_t serial = 1; serial <= 20; ++serial) {
+        const auto call = WireMessage::call(serial, testedInterface, "view");
+        if (::send(socket.get(), call.data(), call.size(), MSG_NOSIGNAL) < 0) {
+            break;
+        }
+    }
+    EXPECT_TRUE(service.log.waitFor("descriptors unread"));
+    EXPECT_TRUE(reads.isAlive());
+}
+
+/// Takes every free descriptor of the process, below a limit lowered for the purpose.
+class NoDescriptorsLeft {
+public:
+    NoDescriptorsLeft()
+    {
+        ::getrlimit(RLIMIT_NOFILE, &previous_);
+        rlimit lower = previous_;
+        lower.rlim_cur = std::min<rlim_t>(previous_.rlim_cur, 256);
+        ::setrlimit(RLIMIT_NOFILE, &lower);
+        for (;;) {
+            FileDescriptor one(::open("/dev/null", O_RDONLY | O_CLOEXEC));
+            if (!one) {
+                break;
+            }
+            fillers_.push_back(std::move(one));
+        }
+    }
+    ~NoDescriptorsLeft() { ::setrlimit(RLIMIT_NOFILE, &previous_); }
+
+private:
+    rlimit previous_{};
+    std::vector<FileDescriptor> fillers_;
+};
+
+TEST(LinuxIpcLimits, WithoutDescriptorsNewcomersAreTurnedAway)
+{
+    TestedService service;
+    ForeignClient before(service.path());
+    ASSERT_TRUE(before.isAlive());
+    std::vector<FileDescriptor> sockets;
+    for (int times = 0; times < 3; ++times) {
+        sockets.emplace_back(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    }
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    service.path().copy(address.sun_path, sizeof address.sun_path - 1);
+    {
+        const NoDescriptorsLeft shortage;
+        for (const auto& socket : sockets) {
+            ASSERT_EQ(::connect(socket.get(), reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
+            EXPECT_TRUE(isClosedByPeer(socket.get()));
+        }
+        EXPECT_EQ(service.log.countContaining("are refused: Too many open files"), 1U);
+        EXPECT_TRUE(before.isAlive());
+    }
+    ForeignClient after(service.path());
+    EXPECT_TRUE(after.isAlive());
+}
+
+TEST(LinuxIpcLimits, DescriptorsInAMessageAreLimited)
+{
+    IpcLimits limits;
+    limits.message.descriptors = 4;
+    TestedService service(limits);
+    ForeignClient client(service.path());
+    const auto file = sealedMemoryFile(writeBinaryPropertyList(PropertyList("value")));
+    for (const int count : {4, 5}) {
+        auto* call = client.newCall("dictionary");
+        sd_bus_message_open_container(call, 'a', "{sv}");
+        for (int number = 0; number < count; ++number) {
+            sd_bus_message_append(call, "{sv}", std::to_string(number).c_str(), "h", file.get());
+        }
+        sd_bus_message_close_container(call);
+        EXPECT_EQ(client.finish(call), count == 4 ? "" : ipc_errors::invalidArguments);
+    }
+}
+
+}  // namespace
+}  // namespace typhon
