@@ -5,8 +5,10 @@
 namespace typhon {
 
 /// Bounds how much is read of one incoming message, which sd-bus itself does only at 128 MiB. Where a message
-/// begins its size is looked up in its header without taking anything off the socket; of a message whose
-/// beginning could not be seen the bytes are counted as they come. The caller locks.
+/// begins its size is looked up in its header without taking anything off the socket. Of a message whose
+/// beginning could not be seen (the first after the handshake, one whose header comes in pieces) the bytes
+/// are counted that wait before each reading; what comes during a reading escapes, up to sd-bus's own bound.
+/// The caller locks.
 class MessageSizeGuard {
 public:
     explicit MessageSizeGuard(std::size_t limit) : limit_(limit) {}
