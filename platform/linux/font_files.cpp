@@ -8,9 +8,6 @@
 
 #include <fcntl.h>
 #include <linux/openat2.h>
-#include <sys/stat.h>
-#include <sys/syscall.h>
-#include <unistd.h>
 
 // A descriptor that was opened read-only is not enough: its holder may reopen the file for writing through
 // /proc/self/fd if the file's owner is his own user. Through a read-only mount he may not. A directory
@@ -22,31 +19,16 @@ namespace {
 
 constexpr std::size_t copyLimit = 64u << 20;
 
-/// A regular file below `top`, opened for reading; or none, with errno set.
-FileDescriptor openBelow(int top, const std::string& relativePath)
-{
-    open_how how{};
-    // A pipe would block, a terminal would become ours: both are refused below, once they are open.
-    how.flags = O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY;
-    how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS | RESOLVE_NO_MAGICLINKS;
-    FileDescriptor file(
-        static_cast<int>(::syscall(SYS_openat2, top, relativePath.c_str(), &how, sizeof how)));
-    struct stat status;
-    if (!file || ::fstat(file.get(), &status) != 0) {
-        return {};
-    }
-    if (!S_ISREG(status.st_mode) || ::fcntl(file.get(), F_SETFL, 0) != 0) {
-        errno = EACCES;
-        return {};
-    }
-    return file;
-}
-
 FileDescriptor copyOf(int file)
 {
     const auto contents = readWhole(file, copyLimit);
     const auto memory = contents.error == 0 ? sealedMemoryFile(contents.bytes) : FileDescriptor();
     return memory ? reopenedReadOnly(memory.get()) : FileDescriptor();
+}
+
+FontFiles::Failure failureOf(int error)
+{
+    return error == ENOENT || error == ENOTDIR ? FontFiles::Failure::missing : FontFiles::Failure::refused;
 }
 
 }  // namespace
@@ -77,12 +59,17 @@ FontFiles::Opening FontFiles::open(const std::string& path)
     }
     const auto treePath = root_.real(tree->path.substr(0, tree->path.size() - 1));
     const FileDescriptor directory(::open(treePath.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    const auto mount = directory ? mountOf(*tree, directory.get()) : nullptr;
-    const int top = mount ? mount->descriptor.get() : directory.get();
-    auto file = directory ? openBelow(top, path.substr(tree->path.size())) : FileDescriptor();
-    if (!file) {
-        return {{}, errno == ENOENT || errno == ENOTDIR ? Failure::missing : Failure::refused};
+    if (!directory) {
+        return {{}, failureOf(errno)};
     }
+    const auto mount = mountOf(*tree, directory.get());
+    const int top = mount ? mount->descriptor.get() : directory.get();
+    constexpr auto beneath = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS | RESOLVE_NO_MAGICLINKS;
+    auto opened = openRegularFile(path.substr(tree->path.size()), top, beneath);
+    if (opened.error != 0) {
+        return {{}, failureOf(opened.error)};
+    }
+    auto file = std::move(opened.file);
     if (!mount) {
         file = copyOf(file.get());
     }
