@@ -59,6 +59,10 @@ TEST(LinuxIpc, StandardInterfacesAnswer)
     const TestedService service;
     ForeignClient client(service.path());
     EXPECT_EQ(client.finish(client.newCall("Ping", "org.freedesktop.DBus.Peer")), "");
+    EXPECT_EQ(client.finish(client.newCall("Hello", "org.freedesktop.DBus", "/org/freedesktop/DBus")), "");
+    EXPECT_EQ(client.text(), ":1.1");
+    EXPECT_EQ(client.finish(client.newCall("ListNames", "org.freedesktop.DBus", "/org/freedesktop/DBus")),
+              "org.freedesktop.DBus.Error.UnknownObject");
     auto* all = client.newCall("GetAll", "org.freedesktop.DBus.Properties");
     sd_bus_message_append(all, "s", testedInterface);
     EXPECT_EQ(client.finish(all), "");

@@ -22,8 +22,9 @@ struct StandardAnswer {
     CallResult result;
 };
 
-/// Answers `org.freedesktop.DBus.Introspectable` and `Properties` (there are no properties); null for every
-/// other interface. `firstText` and `secondText` are the arguments of the call that are strings, if any.
+/// Answers `org.freedesktop.DBus.Introspectable` and `Properties` (there are no properties), and the greeting
+/// that tools send to what they take for a bus; null for everything else. `firstText` and `secondText` are
+/// the arguments of the call that are strings, if any.
 /// (`Peer` is answered by sd-bus.)
 std::optional<StandardAnswer> standardAnswer(const CallTarget& target, const std::string& signature,
                                              const std::string& firstText, const std::string& secondText,
