@@ -52,8 +52,8 @@ UserFontRegistry::SnapshotPointer UserFontRegistry::makeSnapshot(std::optional<P
 {
     auto cleaned = cleanRegistry(root ? *std::move(root) : PropertyList());
     for (const auto& entries : cleaned.leftOut) {
-        TYLog_Error(log_, std::string(path) + ": left out " + std::to_string(entries.count) +
-                              " entries that " + entries.reason + ", the first: " + entries.firstPath);
+        TYLog_Error(log_, std::string(path) + ": entries left out that " + entries.reason + ": " +
+                              std::to_string(entries.count) + ", the first: " + entries.firstPath);
     }
     return std::make_shared<const RegistrySnapshot>(std::move(cleaned.root));
 }

@@ -139,10 +139,40 @@ TEST_F(UserFontRegistryTest, MalformedEntriesAreLoggedOncePerKindAndTheRestServe
     EXPECT_FALSE(holds("/f/X/b.ttf"));
     EXPECT_FALSE(holds("/f/X/d.ttf"));
     EXPECT_EQ(simulated.log.text(LogLevel::error),
-              registryPath + ": left out 2 entries that are not dictionaries, the first: /f/X/b.ttf\n" +
+              registryPath + ": entries left out that are not dictionaries: 2, the first: /f/X/b.ttf\n" +
                   registryPath +
-                  ": left out 1 entries that have a \"disabled\" that is not a boolean, the first: "
-                  "/f/X/d.ttf\n");
+                  ": entries left out that have a \"disabled\" that is not a boolean: 1, "
+                  "the first: /f/X/d.ttf\n");
+
+    registry.userFontsInfo();
+    EXPECT_EQ(simulated.log.entries().size(), 2U);
+    registry.invalidateUserFonts();
+    registry.userFontsInfo();
+    EXPECT_EQ(simulated.log.entries().size(), 4U);
+}
+
+TEST_F(UserFontRegistryTest, AHundredThousandEntriesServe)
+{
+    Dictionary root;
+    for (int number = 0; number < 100'000; ++number) {
+        root.emplace("/f/X/" + std::to_string(number) + ".ttf", Dictionary{});
+    }
+    root.emplace("/f/X/broken.ttf", 1);
+    simulated.fileSystem.addFile(registryPath, std::move(root));
+    EXPECT_EQ(registry.userFontsInfo()->count(), 100'000U);
+    EXPECT_EQ(registry.userFontsInfo()->enumerationView().asDictionary()->size(), 100'000U);
+    EXPECT_EQ(simulated.log.entries().size(), 1U);
+}
+
+TEST_F(UserFontRegistryTest, AnEntryNestedSixtyFourLevelsDeepIsCarriedThrough)
+{
+    PropertyList nested = "deep";
+    for (int level = 0; level < 64; ++level) {
+        nested = Dictionary{{"deeper", nested}};
+    }
+    const PropertyList entry = Dictionary{{"other", nested}};
+    simulated.fileSystem.addFile(registryPath, Dictionary{{"/f/X/a.ttf", entry}});
+    EXPECT_EQ(*registry.userFontsInfo()->enumerationView().find("/f/X/a.ttf"), entry);
 }
 
 TEST_F(UserFontRegistryTest, ARegistryOfMalformedEntriesOnlyIsEmpty)
