@@ -36,7 +36,8 @@ void writeDocument(const Bytes& document)
     for (std::size_t index = 0; index < length.size(); ++index)
         length[index] = static_cast<std::uint8_t>(document.size() >> (56 - index * 8));
     std::fwrite(length.data(), 1, length.size(), stdout);
-    std::fwrite(document.data(), 1, document.size(), stdout);
+    if (!document.empty())
+        std::fwrite(document.data(), 1, document.size(), stdout);
     std::fflush(stdout);
 }
 
