@@ -133,6 +133,7 @@ TEST(LinuxIpcLimits, UnansweredCallsAreLimited)
     EXPECT_EQ(service.log.countContaining("too many unanswered calls"), 1U);
     ForeignClient other(service.path());
     EXPECT_TRUE(other.isAlive());
+    ASSERT_TRUE(service.log.waitFor("holding a call", 3));
     service.delegate->object->release();
     EXPECT_TRUE(client.isAlive());
 }

@@ -74,6 +74,7 @@ public:
         } else if (member == "hold") {
             const std::lock_guard lock(mutex_);
             held_.push_back(call);
+            TYLog(log_, "holding a call");
         } else if (member == "releaseAll") {
             release();
             call->reply({});
