@@ -124,16 +124,17 @@ TEST(LinuxIpcLimits, UnansweredCallsAreLimited)
     for (int times = 0; times < 5; ++times) {
         // Dropped by the service: nobody is left who could answer, so they do not count.
         client.start("never");
+        ASSERT_TRUE(client.isAlive());
     }
-    for (int times = 0; times < 3; ++times) {
+    for (std::size_t times = 1; times <= 3; ++times) {
         client.start("hold");
+        ASSERT_TRUE(service.log.waitFor("holding a call", times));
     }
     EXPECT_EQ(client.call("hold"), ipc_errors::limitsExceeded);
     EXPECT_EQ(client.callText("echo", "x"), ipc_errors::limitsExceeded);
     EXPECT_EQ(service.log.countContaining("too many unanswered calls"), 1U);
     ForeignClient other(service.path());
     EXPECT_TRUE(other.isAlive());
-    ASSERT_TRUE(service.log.waitFor("holding a call", 3));
     service.delegate->object->release();
     EXPECT_TRUE(client.isAlive());
 }
