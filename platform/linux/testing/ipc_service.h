@@ -181,7 +181,11 @@ public:
         sd_bus_set_method_call_timeout(bus, 20'000'000);
         started = sd_bus_start(bus) >= 0;
     }
-    ~ForeignClient() { sd_bus_flush_close_unref(bus); }
+    ~ForeignClient()
+    {
+        sd_bus_message_unref(reply);
+        sd_bus_flush_close_unref(bus);
+    }
     ForeignClient(const ForeignClient&) = delete;
     ForeignClient& operator=(const ForeignClient&) = delete;
 
