@@ -53,6 +53,8 @@ struct Platform {
     Log& log;
     ApplicationRegistry& applicationRegistry;
     TYUserFontManager& userFontManager;
+    /// The internal-build query: whether this is an internal build of the system.
+    bool isInternalBuild = false;
 
     ProcessWideQueues processWideQueues{queues};
 };

@@ -24,8 +24,9 @@ constexpr PropertyListLimits statementLimits{.bytes = 256 * 1024, .depth = 16, .
 
 Bytes signedBytes(std::span<const std::uint8_t> statement)
 {
-    Bytes bytes(domain.begin(), domain.end());
-    bytes.insert(bytes.end(), statement.begin(), statement.end());
+    Bytes bytes(domain.size() + statement.size());
+    const auto end = std::copy(domain.begin(), domain.end(), bytes.begin());
+    std::copy(statement.begin(), statement.end(), end);
     return bytes;
 }
 

@@ -1,0 +1,131 @@
+#include "daemon/start_up.h"
+#include "daemon/typhon_daemon.h"
+#include "fontmanager/linux_user_font_manager.h"
+#include "platform/linux/audit_tokens.h"
+#include "platform/linux/confinement.h"
+#include "platform/linux/event_pool.h"
+#include "platform/linux/extension_tokens.h"
+#include "platform/linux/file_access_broker.h"
+#include "platform/linux/linux_application_registry.h"
+#include "platform/linux/linux_clock.h"
+#include "platform/linux/linux_code_signing.h"
+#include "platform/linux/linux_file_system.h"
+#include "platform/linux/linux_ipc.h"
+#include "platform/linux/linux_log.h"
+#include "platform/linux/linux_preferences.h"
+#include "platform/linux/linux_sandbox.h"
+#include "platform/linux/linux_work_queues.h"
+#include "platform/linux/process_inspection.h"
+#include "platform/linux/process_limits.h"
+#include "platform/linux/sandbox_instances.h"
+#include "platform/linux/sandboxes_service.h"
+#include "platform/linux/signature_store.h"
+
+#include <filesystem>
+#include <map>
+#include <string>
+
+#include <CLI/CLI.hpp>
+
+// The composition root: the one place that knows the services of Linux. It builds them, hands them to the
+// daemon as a `Platform`, opens the two services beside the daemon's own, and gives the main thread away.
+// Nothing here is ever torn down: the process runs until the system stops it.
+
+namespace typhon {
+
+namespace {
+
+struct Options {
+    std::string root;
+    LogLevel logLevel = LogLevel::defaultLevel;
+    bool isInternalBuild = false;
+};
+
+/// The services of Linux, each after those it stands on.
+struct LinuxServices {
+    explicit LinuxServices(const Options& options)
+        : root(options.root), log(options.logLevel), ipc(pool, queues, log, root, tokenOfPeer)
+    {}
+
+    RootDirectory root;
+    LinuxLog log;
+    EventPool pool;
+    LinuxWorkQueues queues{pool};
+    LinuxClock clock;
+    LinuxPreferences preferences{root, log};
+    LinuxFileSystem fileSystem{root};
+    LinuxApplicationRegistry applicationRegistry{root, log};
+    LinuxUserFontManager userFontManager;
+
+    ConfinementProbe probe;
+    SignatureStore signatures{root, log};
+    SandboxInstances sandboxInstances{probe, signatures, pool};
+    LinuxCodeSigning codeSigning{probe, sandboxInstances, signatures};
+    ExtensionTokens tokens;
+    LinuxSandbox sandbox{probe, tokens, root};
+    LinuxIpc ipc;
+};
+
+Options parsed(int argc, char** argv)
+{
+    Options options;
+    CLI::App app{
+        "Per-application font access: decides which user-installed fonts a program may see and read."};
+    app.name("typhond");
+    app.add_option("--root", options.root, "Put every path of the system under this folder")
+        ->type_name("DIR");
+    const std::map<std::string, LogLevel> levels{
+        {"debug", LogLevel::debug}, {"default", LogLevel::defaultLevel}, {"error", LogLevel::error}};
+    app.add_option("--log-level", options.logLevel, "Least level that is logged: debug, default or error")
+        ->type_name("LEVEL")
+        ->transform(CLI::Transformer(levels));
+    app.add_flag("--internal-build", options.isInternalBuild,
+                 "Behave as on an internal build of the system, where scheduled deletions come sooner");
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& error) {
+        std::exit(app.exit(error) == 0 ? 0 : 2);
+    }
+    if (!options.root.empty()) {
+        options.root = std::filesystem::absolute(options.root).lexically_normal().string();
+    }
+    return options;
+}
+
+void run(const Options& options)
+{
+    static LinuxServices services(options);
+    static Platform platform{.queues = services.queues,
+                             .clock = services.clock,
+                             .ipc = services.ipc,
+                             .codeSigning = services.codeSigning,
+                             .sandbox = services.sandbox,
+                             .preferences = services.preferences,
+                             .fileSystem = services.fileSystem,
+                             .log = services.log,
+                             .applicationRegistry = services.applicationRegistry,
+                             .userFontManager = services.userFontManager,
+                             .isInternalBuild = options.isInternalBuild};
+
+    logProcessIdentity(services.log);
+    const auto broker = std::make_shared<FileAccessBroker>(services.codeSigning, services.tokens,
+                                                           services.root, services.log);
+    const auto sandboxes = std::make_shared<SandboxesService>(services.sandboxInstances, services.log);
+    const auto brokerListener = startFileAccessService(services.ipc, broker);
+    const auto sandboxesListener = startSandboxesService(services.ipc, sandboxes);
+
+    const auto daemon = TyphonDaemon::sharedDaemon(platform);
+    startUp(*daemon);
+    daemon->run();
+}
+
+}  // namespace
+
+}  // namespace typhon
+
+int main(int argc, char** argv)
+{
+    const auto options = typhon::parsed(argc, argv);
+    typhon::prepareProcess();
+    typhon::run(options);
+}
