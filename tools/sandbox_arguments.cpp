@@ -9,13 +9,15 @@
 #include <string_view>
 
 // The sandbox starts as an empty folder in memory. Every entry of the host's "/" is bound into it read-only,
-// but for the folders that it has of its own (/proc, /dev, /tmp, /run), and the folders with typhon's files
-// are covered by empty ones. Since "/" is its own, a bind can have a destination that the host lacks. A
-// destination inside a folder of the host is another matter, as nothing can be made there: that folder is
-// replaced by one in memory which holds a bind of each of its entries. Typhon's sockets are bound back, then
-// the binds asked for, then the program itself (with the folder it lies in, if that would not be seen
-// otherwise, as programs have files beside them), and at last everything that was made in memory is closed
-// for writing, but for /tmp and /run.
+// but for the folders that it has of its own (/proc, /dev, /run), and the folders with typhon's files are
+// covered by empty ones. Its /tmp is its own to write to, with the host's entries bound into it read-only,
+// but for those that hold sockets: terminal multiplexers, agents and displays listen there, and whoever
+// reaches them has a program started outside. Since "/" is its own, a bind can have a destination that the
+// host lacks. A destination inside a folder of the host is another matter, as nothing can be made there: that
+// folder is replaced by one in memory which holds a bind of each of its entries. Typhon's sockets are bound
+// back, then the binds asked for, then the program itself (with the folder it lies in, if that would not be
+// seen otherwise, as programs have files beside them), and at last everything that was made in memory is
+// closed for writing, but for /tmp and /run.
 //
 // No network and no sockets of the host's services: a program that reaches the user's service manager would
 // have itself started outside.
@@ -29,7 +31,8 @@ using Kind = HostFiles::Kind;
 
 /// Far below what bubblewrap takes (9,000 words), at three words an entry.
 constexpr std::size_t mostEntriesInReplacedFolder = 2000;
-constexpr std::array<std::string_view, 4> ownFolders{"/proc", "/dev", "/tmp", "/run"};
+constexpr std::array<std::string_view, 3> ownFolders{"/proc", "/dev", "/run"};
+constexpr const char* temporary = "/tmp";
 /// Where a whole system keeps fonts, registry and preferences.
 constexpr std::array<std::string_view, 2> typhonFolders{"/var/mobile", "/private"};
 
@@ -54,7 +57,8 @@ public:
         add({"--unshare-user", "--unshare-ipc", "--unshare-pid", "--unshare-net", "--unshare-uts",
              "--unshare-cgroup-try", "--cap-drop", "ALL", "--new-session", "--die-with-parent"});
         addHost();
-        add({"--proc", "/proc", "--dev", "/dev", "--tmpfs", "/tmp", "--tmpfs", "/run"});
+        add({"--proc", "/proc", "--dev", "/dev", "--tmpfs", "/run"});
+        addTemporary();
         if (auto failure = addReplacedFolders()) {
             return *failure;
         }
@@ -96,10 +100,34 @@ private:
     {
         for (const auto& name : host_.names("/").value_or(Words{})) {
             const auto path = "/" + name;
-            if (std::find(ownFolders.begin(), ownFolders.end(), path) == ownFolders.end()) {
+            if (path != temporary &&
+                std::find(ownFolders.begin(), ownFolders.end(), path) == ownFolders.end()) {
                 addEntry(path);
             }
         }
+    }
+
+    void addTemporary()
+    {
+        add({"--tmpfs", temporary});
+        for (const auto& name : host_.names(temporary).value_or(Words{})) {
+            const auto path = std::string(temporary) + "/" + name;
+            if (!holdsSockets(path) || isWithin(request_.executable, path)) {
+                addEntry(path);
+            }
+        }
+    }
+
+    /// True as well when it cannot be told.
+    bool holdsSockets(const std::string& path) const
+    {
+        if (host_.kind(path) != Kind::directory) {
+            return false;
+        }
+        const auto names = host_.names(path);
+        return !names || std::any_of(names->begin(), names->end(), [&](const std::string& name) {
+            return host_.kind(path + "/" + name) == Kind::other;
+        });
     }
 
     /// Binds of folders that hold typhon's come before those are covered, all others after it.
@@ -153,8 +181,11 @@ private:
 
     Words hidden() const
     {
-        return request_.root.empty() ? Words(typhonFolders.begin(), typhonFolders.end())
-                                     : Words{request_.root};
+        Words folders;
+        for (const auto folder : typhonFolders) {
+            folders.push_back(request_.root + std::string(folder));
+        }
+        return folders;
     }
 
     /// Where a destination lies once the host's symbolic links are followed.
@@ -173,7 +204,7 @@ private:
         while (host_.kind(folder) == Kind::missing) {
             folder = parentOf(folder);
         }
-        return folder == "/" ? std::string() : folder;
+        return folder == "/" || folder == temporary ? std::string() : folder;
     }
 
     std::optional<ClientError> addReplacedFolders()

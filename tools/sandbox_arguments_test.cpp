@@ -13,7 +13,7 @@ using testing::HasSubstr;
 using testing::Not;
 using Words = std::vector<std::string>;
 
-/// A host given by a list of paths: "dir/", "file" or "link -> target".
+/// A host given by a list of paths: "dir/", "file", "socket=" or "link -> target".
 class FakeHost : public HostFiles {
 public:
     explicit FakeHost(const Words& paths)
@@ -26,6 +26,9 @@ public:
             } else if (path.back() == '/') {
                 path.pop_back();
                 entries_[path] = {Kind::directory, ""};
+            } else if (path.back() == '=') {
+                path.pop_back();
+                entries_[path] = {Kind::other, ""};
             } else {
                 entries_[path] = {Kind::file, ""};
             }
@@ -125,13 +128,28 @@ TEST(SandboxArguments, BindTheHostReadOnlyAndKeepItsLinks)
     EXPECT_THAT(words, Not(Contains("--bind")));
 }
 
-TEST(SandboxArguments, MakeProcDevTmpAndRunAnew)
+TEST(SandboxArguments, MakeProcDevAndRunAnew)
 {
     const auto words = wordsFor(request());
-    EXPECT_GE(position(words, {"--proc", "/proc", "--dev", "/dev", "--tmpfs", "/tmp", "--tmpfs", "/run"}), 0);
+    EXPECT_GE(position(words, {"--proc", "/proc", "--dev", "/dev", "--tmpfs", "/run"}), 0);
     for (const char* own : {"/proc", "/dev", "/tmp", "/run"}) {
         EXPECT_EQ(position(words, {"--ro-bind", own, own}), -1) << own;
     }
+}
+
+TEST(SandboxArguments, ShowTheHostsTemporaryFilesInATmpOfItsOwn)
+{
+    const auto words = wordsFor(request());
+    expectBefore(words, {"--tmpfs", "/tmp"}, {"--ro-bind", "/tmp/x", "/tmp/x"});
+    EXPECT_EQ(position(words, {"--remount-ro", "/tmp"}), -1);
+}
+
+TEST(SandboxArguments, LeaveOutTemporaryFoldersThatHoldSockets)
+{
+    auto host = machine;
+    host.push_back("/tmp/agent/");
+    host.push_back("/tmp/agent/socket=");
+    EXPECT_EQ(position(wordsFor(request(), host), {"--ro-bind", "/tmp/agent", "/tmp/agent"}), -1);
 }
 
 TEST(SandboxArguments, CoverTheMachinesFontsAndShowItsSockets)
@@ -147,11 +165,15 @@ TEST(SandboxArguments, CoverAScratchSystemButForItsSockets)
 {
     auto scratch = request();
     scratch.root = "/home/u";
-    const auto words = wordsFor(scratch);
-    expectBefore(words, {"--ro-bind", "/home", "/home"}, {"--tmpfs", "/home/u"});
-    expectBefore(words, {"--tmpfs", "/home/u"}, {"--ro-bind", "/home/u/run/typhon", "/home/u/run/typhon"});
+    auto host = machine;
+    host.push_back("/home/u/var/");
+    host.push_back("/home/u/var/mobile/");
+    const auto words = wordsFor(scratch, host);
+    expectBefore(words, {"--ro-bind", "/home", "/home"}, {"--tmpfs", "/home/u/var/mobile"});
+    expectBefore(words, {"--tmpfs", "/home/u/var/mobile"},
+                 {"--ro-bind", "/home/u/run/typhon", "/home/u/run/typhon"});
     EXPECT_GE(position(words, {"--setenv", "TYPHON_ROOT", "/home/u"}), 0);
-    EXPECT_GE(position(words, {"--remount-ro", "/home/u"}), 0);
+    EXPECT_GE(position(words, {"--remount-ro", "/home/u/var/mobile"}), 0);
 }
 
 TEST(SandboxArguments, BindToAPlaceThatExists)
@@ -205,8 +227,9 @@ TEST(SandboxArguments, CoverFontsThatABindBringsBack)
     binding.root = "/home/u/scratch";
     binding.binds = {{"/home/u", "/home/u"}};
     auto host = machine;
-    host.push_back("/home/u/scratch/");
-    expectBefore(wordsFor(binding, host), {"--bind", "/home/u", "/home/u"}, {"--tmpfs", "/home/u/scratch"});
+    host.push_back("/home/u/scratch/var/mobile/");
+    expectBefore(wordsFor(binding, host), {"--bind", "/home/u", "/home/u"},
+                 {"--tmpfs", "/home/u/scratch/var/mobile"});
 }
 
 TEST(SandboxArguments, FollowTheHostsLinksToADestination)
@@ -218,27 +241,26 @@ TEST(SandboxArguments, FollowTheHostsLinksToADestination)
 
 TEST(SandboxArguments, ShowAProgramInAFolderThatWouldBeMissing)
 {
-    const auto words = wordsFor({"/tmp/x/folder/app", "/tmp/x/folder/app", {}, {}});
-    expectBefore(words, {"--tmpfs", "/tmp"}, {"--ro-bind", "/tmp/x/folder", "/tmp/x/folder"});
-    EXPECT_GE(position(words, {"--ro-bind", "/tmp/x/folder/app", "/tmp/x/folder/app"}), 0);
+    const auto words = wordsFor({"/run/x/app", "/run/x/app", {}, {}});
+    expectBefore(words, {"--tmpfs", "/run"}, {"--ro-bind", "/run/x", "/run/x"});
+    EXPECT_GE(position(words, {"--ro-bind", "/run/x/app", "/run/x/app"}), 0);
 }
 
 TEST(SandboxArguments, ShowNoMoreThanTheProgramWhereItsFolderIsPrivateOrCovered)
 {
-    auto host = machine;
-    host.push_back("/tmp/app");
-    const auto words = wordsFor({"/tmp/app", "/tmp/app", {}, {}}, host);
-    EXPECT_EQ(position(words, {"--ro-bind", "/tmp", "/tmp"}), -1);
-    EXPECT_GE(position(words, {"--ro-bind", "/tmp/app", "/tmp/app"}), 0);
+    const auto words = wordsFor({"/run/app", "/run/app", {}, {}});
+    EXPECT_EQ(position(words, {"--ro-bind", "/run", "/run"}), -1);
+    EXPECT_GE(position(words, {"--ro-bind", "/run/app", "/run/app"}), 0);
 
-    const auto scratch = wordsFor({"/tmp/x/folder/app", "/tmp/x/folder/app", {}, "/tmp/x"}, host);
-    EXPECT_EQ(position(scratch, {"--ro-bind", "/tmp/x/folder", "/tmp/x/folder"}), -1);
+    const auto covered = wordsFor({"/var/mobile/app", "/var/mobile/app", {}, {}});
+    EXPECT_EQ(position(covered, {"--ro-bind", "/var/mobile", "/var/mobile"}), -1);
+    EXPECT_GE(position(covered, {"--ro-bind", "/var/mobile/app", "/var/mobile/app"}), 0);
 }
 
 TEST(SandboxArguments, StartAProgramUnderTheNameOfALinkThatWouldBeMissing)
 {
-    const auto words = wordsFor({"/usr/bin/app", "/tmp/link", {}, {}});
-    EXPECT_GE(position(words, {"--ro-bind", "/usr/bin/app", "/tmp/link"}), 0);
+    const auto words = wordsFor({"/usr/bin/app", "/run/link", {}, {}});
+    EXPECT_GE(position(words, {"--ro-bind", "/usr/bin/app", "/run/link"}), 0);
     const auto seen = wordsFor({"/usr/bin/app", "/bin/app", {}, {}});
     EXPECT_EQ(position(seen, {"--ro-bind", "/usr/bin/app", "/bin/app"}), -1);
 }

@@ -36,7 +36,7 @@ void declare(CLI::App& command, Options& options)
     // Shown by --help only: the words were taken off the command line before it is parsed.
     command.add_option("program", "What to run; all that follows it is its own")
         ->type_name("EXECUTABLE [ARG]...");
-    command.footer("The program sees the host read-only, without the font files, the network, /run and /tmp, "
+    command.footer("The program sees the host read-only, without the font files, the network and /run, "
                    "but with typhon's sockets. Standard input and output are passed through, and so are the "
                    "exit status and signals.");
 }
