@@ -35,11 +35,11 @@ class Client:
             plain.connect(f"/proc/self/fd/{directory}/{os.path.basename(path)}")
         finally:
             os.close(directory)
-        gio_socket = Gio.Socket.new_from_fd(plain.detach())
-        return Gio.SocketConnection.factory_create_connection(gio_socket)
+        return Gio.Socket.new_from_fd(plain.detach()).connection_factory_create_connection()
 
     def close(self):
-        self.connection.close_sync(None)
+        if not self.connection.is_closed():
+            self.connection.close_sync(None)
 
     def call(self, protocol, member, arguments=None, files=(), timeout=60000):
         """The reply's arguments as Python values, and its descriptors. Raises GLib.Error."""

@@ -119,8 +119,8 @@ class ForeignClient(unittest.TestCase):
 
     def gdbus(self, *arguments):
         address = f"unix:path={self.system.socket_path(SERVICE)}"
-        return subprocess.run(["gdbus", arguments[0], "--address", address, "--object-path",
-                               "/com/vorlan/typhond", *arguments[1:]],
+        return subprocess.run(["gdbus", arguments[0], "--address", address, "--dest", SERVICE,
+                               "--object-path", "/com/vorlan/typhond", *arguments[1:]],
                               capture_output=True, text=True, timeout=60, check=True).stdout
 
     def test_gdbus_introspects_and_calls(self):

@@ -1,10 +1,9 @@
 """The daemon can be killed at any moment; what it had promised is there afterwards."""
 
 import signal
-import subprocess
 import unittest
 
-from scratch_system import BIN, ScratchSystem, entry, eventually
+from scratch_system import Daemon, ScratchSystem, entry, eventually
 
 
 class Restart(unittest.TestCase):
@@ -34,13 +33,10 @@ class Restart(unittest.TestCase):
 
     def test_a_second_daemon_does_not_take_the_service_over(self):
         self.system.start()
-        second = subprocess.Popen([BIN / "typhond", "--root", self.system.root], stderr=subprocess.PIPE)
-        try:
-            self.assertIn(b"error [", second.stderr.readline())
-            self.assertIsNotNone(self.system.checkin(self.writer))
-        finally:
-            second.kill()
-            second.communicate()
+        second = Daemon(self.system)
+        self.addCleanup(second.kill)
+        second.wait_for_line("error [")
+        self.assertIsNotNone(self.system.checkin(self.writer))
 
     def test_fonts_changed_while_it_was_down_are_seen(self):
         self.system.start()

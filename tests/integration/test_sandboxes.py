@@ -44,7 +44,7 @@ class Sandboxes(unittest.TestCase):
         self.assertIsNone(self.output(*BARE_SANDBOX, *self.checkin_command(self.viewer)))
 
     def test_a_process_namespace_below_a_registered_sandbox_inherits_its_identity(self):
-        nested = ["unshare", "--user", "--map-root-user", "--pid", "--fork"]
+        nested = ["unshare", "--user", "--pid", "--fork"]
         program = self.runner()
         view = self.output(*self.launcher("--bind", self.system.folder, self.system.folder),
                            program, *nested, *self.checkin_command(self.viewer))

@@ -47,16 +47,16 @@ class Signatures(unittest.TestCase):
     def test_a_signature_for_another_executable_does_not_count(self):
         signed = self.signed("org.example.viewer", "vendor", [])
         folder = self.system.real("/var/lib/typhon/signatures")
-        (signature,) = folder.iterdir()
+        (signature,) = folder.glob("*.plist")
         other = self.signed("org.example.plain", "vendor", [], capabilities=())
-        (others,) = [path for path in folder.iterdir() if path != signature]
+        (others,) = [path for path in folder.glob("*.plist") if path != signature]
         others.write_bytes(signature.read_bytes())
         self.assertTrue(self.sees_fonts(signed))
         self.assertFalse(self.sees_fonts(other))
 
     def test_a_changed_signature_does_not_count(self):
         program = self.signed("org.example.viewer", "vendor", [])
-        (signature,) = self.system.real("/var/lib/typhon/signatures").iterdir()
+        (signature,) = self.system.real("/var/lib/typhon/signatures").glob("*.plist")
         whole = signature.read_bytes()
         for position in range(0, len(whole), 7):
             changed = bytearray(whole)
