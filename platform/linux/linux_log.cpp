@@ -84,8 +84,10 @@ void LinuxLog::write(LogSink sink, LogLevel level, std::string_view message)
         writeToJournal(journalFields(sink, level, message));
         return;
     }
-    writeLine(descriptor_,
-              fmt::format("{} [{}] {}\n", nameOf(level), nameOf(sink), visibleText(message, longestMessage)));
+    const auto line =
+        fmt::format("{} [{}] {}\n", nameOf(level), nameOf(sink), visibleText(message, longestMessage));
+    const std::lock_guard lock(writing_);
+    writeLine(descriptor_, line);
 }
 
 const char* nameOf(LogLevel level)
