@@ -77,6 +77,13 @@ class Sandboxes(unittest.TestCase):
                              "register-sandbox", str(os.getpid()), self.viewer)
         self.assertIn("error", answer)
 
+    def test_a_forged_link_to_the_executable_is_not_believed(self):
+        forged = [BIN / "forged-checkin", self.system.root, self.viewer]
+        for own_namespace in (["unshare", "--user", "--map-root-user"], [*BARE_SANDBOX[:-1], "--cap-add", "ALL", "--"]):
+            done = subprocess.run([str(part) for part in [*own_namespace, *forged]], capture_output=True,
+                                  text=True, timeout=60)
+            self.assertEqual((done.returncode, done.stdout), (0, f"{self.viewer}\nno share\n"), done.stderr)
+
     def test_an_unsigned_program_runs_in_a_sandbox_without_identity(self):
         self.assertIsNone(self.output(*self.launcher(), *self.checkin_command(self.system.program())))
 
