@@ -80,7 +80,7 @@ private:
     void add(std::initializer_list<std::string> words) { words_.insert(words_.end(), words); }
 
     /// Binds one entry of a host folder at its own path.
-    void addEntry(const std::string& path)
+    void addEntry(const std::string& path, const char* option = "--ro-bind")
     {
         switch (host_.kind(path)) {
         case Kind::symbolicLink:
@@ -88,7 +88,7 @@ private:
             break;
         case Kind::directory:
         case Kind::file:
-            add({"--ro-bind", path, path});
+            add({option, path, path});
             break;
         case Kind::missing:
         case Kind::other:
@@ -113,7 +113,8 @@ private:
         for (const auto& name : host_.names(temporary).value_or(Words{})) {
             const auto path = std::string(temporary) + "/" + name;
             if (!holdsSockets(path) || isWithin(request_.executable, path)) {
-                addEntry(path);
+                // Temporary files may be gone by the time that bubblewrap looks.
+                addEntry(path, "--ro-bind-try");
             }
         }
     }

@@ -140,7 +140,7 @@ TEST(SandboxArguments, MakeProcDevAndRunAnew)
 TEST(SandboxArguments, ShowTheHostsTemporaryFilesInATmpOfItsOwn)
 {
     const auto words = wordsFor(request());
-    expectBefore(words, {"--tmpfs", "/tmp"}, {"--ro-bind", "/tmp/x", "/tmp/x"});
+    expectBefore(words, {"--tmpfs", "/tmp"}, {"--ro-bind-try", "/tmp/x", "/tmp/x"});
     EXPECT_EQ(position(words, {"--remount-ro", "/tmp"}), -1);
 }
 
@@ -149,7 +149,7 @@ TEST(SandboxArguments, LeaveOutTemporaryFoldersThatHoldSockets)
     auto host = machine;
     host.push_back("/tmp/agent/");
     host.push_back("/tmp/agent/socket=");
-    EXPECT_EQ(position(wordsFor(request(), host), {"--ro-bind", "/tmp/agent", "/tmp/agent"}), -1);
+    EXPECT_EQ(position(wordsFor(request(), host), {"--ro-bind-try", "/tmp/agent", "/tmp/agent"}), -1);
 }
 
 TEST(SandboxArguments, CoverTheMachinesFontsAndShowItsSockets)

@@ -12,6 +12,7 @@
 #include <fcntl.h>
 #include <nlohmann/json.hpp>
 #include <sys/mman.h>
+#include <sys/socket.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 
@@ -45,6 +46,16 @@ Pipe makePipe()
 {
     int ends[2] = {-1, -1};
     if (::pipe2(ends, O_CLOEXEC) < 0) {
+        return {};
+    }
+    return {movedUp(ends[0]), movedUp(ends[1])};
+}
+
+/// A pipe that can be written to without a signal when the reader is gone.
+Pipe makeReleasePipe()
+{
+    int ends[2] = {-1, -1};
+    if (::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) < 0) {
         return {};
     }
     return {movedUp(ends[0]), movedUp(ends[1])};
@@ -153,7 +164,7 @@ ClientResult<SandboxProcess> SandboxProcess::start(const Words& options, const W
 {
     const auto optionsDescriptor = optionsFile(options);
     auto information = makePipe();
-    auto release = makePipe();
+    auto release = makeReleasePipe();
     if (!optionsDescriptor || !information.writing || !release.writing) {
         return systemError(errno, notMade);
     }
@@ -223,7 +234,7 @@ int SandboxProcess::releaseAndWait()
     }
     ::pthread_sigmask(SIG_BLOCK, &awaited, &before);
     const char go = 1;
-    [[maybe_unused]] const auto written = ::write(release_.get(), &go, 1);
+    [[maybe_unused]] const auto written = ::send(release_.get(), &go, 1, MSG_NOSIGNAL);
     release_ = FileDescriptor();
     auto status = statusOf(bubblewrap_, WNOHANG);
     while (!status) {
