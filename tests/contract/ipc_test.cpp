@@ -28,6 +28,7 @@ using testing::Not;
 
 constexpr const char* serviceName = "com.vorlan.test";
 
+template <std::uint64_t Seed>
 class SimulatedWorld : public IpcWorld {
 public:
     Ipc& server() override { return machine_; }
@@ -43,7 +44,7 @@ public:
     void passTime(std::chrono::nanoseconds duration) override { scheduler_.advance(duration); }
 
 private:
-    SimulatedScheduler scheduler_{17};
+    SimulatedScheduler scheduler_{Seed};
     SimulatedWorkQueues queues_{scheduler_};
     SimulatedLog log_;
     SimulatedIpc machine_{queues_, log_, AuditToken{1, 10, 100, 1, 0, 1}};
@@ -214,7 +215,10 @@ protected:
 };
 
 INSTANTIATE_TEST_SUITE_P(Worlds, IpcContract,
-                         testing::Values(WorldKind{"simulated", make<SimulatedWorld>},
+                         testing::Values(WorldKind{"simulated_seed_1", make<SimulatedWorld<1>>},
+                                         WorldKind{"simulated_seed_2", make<SimulatedWorld<2>>},
+                                         WorldKind{"simulated_seed_3", make<SimulatedWorld<3>>},
+                                         WorldKind{"simulated_seed_4", make<SimulatedWorld<4>>},
                                          WorldKind{"linux", make<LinuxWorld>}),
                          [](const auto& kind) { return std::string(kind.param.name); });
 
