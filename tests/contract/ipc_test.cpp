@@ -22,7 +22,6 @@ namespace typhon {
 namespace {
 
 using testing::Contains;
-using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::Not;
 
