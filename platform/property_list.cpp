@@ -56,6 +56,7 @@ private:
             postponed.pop_back();
             std::visit([](auto& deeper) { clear(deeper); }, next);
         }
+        current_.postponed = nullptr;
     }
 
     struct State {
@@ -69,8 +70,10 @@ constinit thread_local Disposal::State Disposal::current_{};
 
 template <typename Contents>
 struct Node {
+    // Nodes are neither copied nor moved.
     template <typename Value>
-    explicit Node(Value&& value) : contents(std::forward<Value>(value))
+    explicit Node(Value&& value)  // NOLINT(bugprone-forwarding-reference-overload)
+        : contents(std::forward<Value>(value))
     {}
     Node(const Node&) = delete;
     Node& operator=(const Node&) = delete;

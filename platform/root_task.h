@@ -67,6 +67,7 @@ RootTask runToEnd(Item& item, Task<void> work)
 {
     try {
         Task<void> running = std::move(work);
+        // NOLINTNEXTLINE(bugprone-use-after-move): the check takes the coroutine's frame for a second use.
         co_await std::move(running);
     } catch (...) {
         abortBecauseOf(std::current_exception(), item.queue.label());

@@ -34,7 +34,7 @@ std::string foundExecutable(const std::string& executable)
     const char* searched = std::getenv("PATH");
     std::istringstream folders(searched == nullptr ? "/usr/bin:/bin" : searched);
     for (std::string folder; std::getline(folders, folder, ':');) {
-        const auto candidate = (folder.empty() ? "." : folder) + "/" + executable;
+        auto candidate = (folder.empty() ? "." : folder) + "/" + executable;
         struct stat status {};
         if (::stat(candidate.c_str(), &status) == 0 && S_ISREG(status.st_mode) &&
             ::access(candidate.c_str(), X_OK) == 0) {

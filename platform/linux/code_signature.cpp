@@ -16,8 +16,10 @@ namespace typhon {
 
 namespace {
 
-constexpr std::string_view domain{"com.vorlan.typhond code signature 1", 36};
-static_assert(domain.back() == '\0');
+using namespace std::string_view_literals;
+
+// With a zero byte at its end.
+constexpr auto domain = "com.vorlan.typhond code signature 1\0"sv;
 constexpr const char* signatureType = "typhon code signature";
 constexpr PropertyListLimits fileLimits{.bytes = signatureFileLimit, .depth = 2, .values = 16};
 constexpr PropertyListLimits statementLimits{.bytes = 256 * 1024, .depth = 16, .values = 8192};

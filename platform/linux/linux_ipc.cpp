@@ -65,6 +65,7 @@ std::shared_ptr<IpcContext> makeContext(EventPool& pool, WorkQueues& queues, Log
     auto accounting =
         std::make_shared<ConnectionAccounting>(limits.connectionsPerProcess, limits.connectionsPerUser);
     // Not an aggregate that could be made in place: it holds a mutex.
+    // NOLINTNEXTLINE(modernize-make-shared)
     return std::shared_ptr<IpcContext>(
         new IpcContext{pool,
                        queues,

@@ -40,6 +40,7 @@ int priorityOf(LogLevel level)
 void writeToJournal(const std::vector<std::string>& fields)
 {
     std::vector<iovec> vectors;
+    vectors.reserve(fields.size());
     for (const auto& field : fields) {
         vectors.push_back({.iov_base = const_cast<char*>(field.data()), .iov_len = field.size()});
     }

@@ -33,8 +33,7 @@ std::shared_ptr<SimulatedQueue> SimulatedWorkQueues::createQueue(std::string lab
         registry->queues.erase(queue);
         delete queue;
     };
-    const std::shared_ptr<SimulatedQueue> queue(new SimulatedQueue(scheduler_, std::move(label), serial),
-                                                forget);
+    std::shared_ptr<SimulatedQueue> queue(new SimulatedQueue(scheduler_, std::move(label), serial), forget);
     registry_->queues.emplace(queue.get(), queue);
     if (registry_->closed) {
         queue->close();
