@@ -20,12 +20,14 @@ PREFIX = "com.vorlan.typhond."
 
 
 class Client:
-    def __init__(self, root, service=SERVICE, descriptors=True):
+    def __init__(self, root, service=SERVICE):
         """Connects to a service of the system in `root`, over a socket path of any length."""
         self.connection = Gio.DBusConnection.new_sync(
             self._stream(f"{root}/run/typhon/{service}"), None,
             Gio.DBusConnectionFlags.AUTHENTICATION_CLIENT, None, None)
-        self.descriptors = descriptors
+        # Descriptors must not arrive together with the end of the handshake.
+        self.connection.call_sync(None, PATH, "org.freedesktop.DBus.Peer", "Ping", None, None,
+                                  Gio.DBusCallFlags.NONE, 60000, None)
 
     @staticmethod
     def _stream(path):
@@ -108,7 +110,7 @@ def answer_of(call):
     try:
         return call()
     except GLib.Error as error:
-        return {"error": error_name(error)}
+        return {"error": error_name(error) or error.message}
 
 
 def run(root, command, *arguments):
