@@ -62,7 +62,7 @@ public:
     SimulatedPreferences preferences;
     SimulatedFileSystem fileSystem;
     SimulatedApplicationRegistry applicationRegistry;
-    SimulatedUserFontManager userFontManager;
+    SimulatedUserFontManager userFontManager{scheduler, fileSystem};
 
 private:
     std::unique_ptr<SimulatedIpc> ownedIpc_ = std::make_unique<SimulatedIpc>(queues, log);

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <set>
 #include <string_view>
 #include <utility>
 
@@ -13,6 +14,25 @@ namespace typhon {
 namespace {
 
 constexpr std::size_t longestFileName = 255;
+constexpr const char* registryPath = "/var/mobile/Library/UserFonts/UserFonts.plist";
+constexpr std::string_view fontFiles = "/var/mobile/Library/UserFonts/FontFiles/";
+
+/// The name of the directory below the font files' that holds the file, or empty.
+std::string providerDirectoryOf(std::string_view path)
+{
+    if (!path.starts_with(fontFiles)) {
+        return {};
+    }
+    path.remove_prefix(fontFiles.size());
+    const auto end = path.find('/');
+    return std::string(end == std::string_view::npos ? "" : path.substr(0, end));
+}
+
+std::string pathOf(std::string_view url)
+{
+    constexpr std::string_view scheme = "file://";
+    return std::string(url.starts_with(scheme) ? url.substr(scheme.size()) : url);
+}
 
 bool standsForItself(char c)
 {
@@ -68,6 +88,101 @@ SimulatedUserFontManager::identifierFromDirectoryName(const std::string& directo
     }
     return directoryNameFromIdentifier(identifier) == directoryName ? std::optional(identifier)
                                                                     : std::nullopt;
+}
+
+PropertyList SimulatedUserFontManager::userFontsInfo()
+{
+    auto reading = fileSystem_.readPropertyList(registryPath);
+    return reading.value && reading.value->asDictionary() ? *std::move(reading.value)
+                                                          : PropertyList(PropertyList::Dictionary{});
+}
+
+std::vector<std::string> SimulatedUserFontManager::knownFontProviders()
+{
+    std::set<std::string> providers;
+    const auto entries = userFontsInfo();
+    for (const auto& [path, entry] : *entries.asDictionary()) {
+        if (const auto identifier = identifierFromDirectoryName(providerDirectoryOf(path))) {
+            providers.insert(*identifier);
+        }
+    }
+    return {providers.begin(), providers.end()};
+}
+
+void SimulatedUserFontManager::enableOrDisablePersistentURLs(std::vector<std::string> urls, bool enabled,
+                                                             std::function<void(FontManagerError)> completion)
+{
+    calls_.push_back("enableOrDisablePersistentURLs " + std::to_string(urls.size()));
+    start([this, urls = std::move(urls), enabled, completion = std::move(completion)] {
+        const auto error = change([&](PropertyList::Dictionary& entries) -> FontManagerError {
+            for (const auto& url : urls) {
+                const auto found = entries.find(pathOf(url));
+                if (found == entries.end()) {
+                    return url + " is not registered";
+                }
+                auto entry = *found->second.asDictionary();
+                entry.insert_or_assign("disabled", !enabled);
+                found->second = std::move(entry);
+            }
+            return std::nullopt;
+        });
+        if (completion) {
+            completion(error);
+        }
+    });
+}
+
+void SimulatedUserFontManager::unregisterAndRemoveFontFilesForIdentifier(
+    std::string identifier, std::function<void(FontManagerError)> completionHandler)
+{
+    calls_.push_back("unregisterAndRemoveFontFilesForIdentifier " + identifier);
+    start([this, identifier = std::move(identifier), completionHandler = std::move(completionHandler)] {
+        const auto error = change([&](PropertyList::Dictionary& entries) -> FontManagerError {
+            const auto directory = directoryNameFromIdentifier(identifier);
+            std::erase_if(entries, [&](const auto& pair) {
+                return directory && providerDirectoryOf(pair.first) == *directory;
+            });
+            return std::nullopt;
+        });
+        if (completionHandler) {
+            completionHandler(error);
+        }
+    });
+}
+
+bool SimulatedUserFontManager::finishNext()
+{
+    if (held_.empty()) {
+        return false;
+    }
+    const auto operation = std::move(held_.front());
+    held_.pop_front();
+    operation();
+    return true;
+}
+
+void SimulatedUserFontManager::start(Operation operation)
+{
+    if (isHolding_) {
+        held_.push_back(std::move(operation));
+    } else {
+        scheduler_.post(this, std::move(operation));
+    }
+}
+
+FontManagerError
+SimulatedUserFontManager::change(const std::function<FontManagerError(PropertyList::Dictionary&)>& edit)
+{
+    if (nextError_) {
+        return std::exchange(nextError_, std::nullopt);
+    }
+    const auto before = userFontsInfo();
+    auto entries = *before.asDictionary();
+    auto error = edit(entries);
+    if (!error && PropertyList(entries) != before) {
+        fileSystem_.addFile(registryPath, std::move(entries));
+    }
+    return error;
 }
 
 void SimulatedUserFontManager::synchronizeProfileFonts(std::function<void()> completion)

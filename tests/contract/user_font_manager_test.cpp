@@ -29,7 +29,9 @@ public:
     void finishSynchronizations() override { manager_.finishProfileSynchronizations(); }
 
 private:
-    SimulatedUserFontManager manager_;
+    SimulatedScheduler scheduler_{1};
+    SimulatedFileSystem fileSystem_;
+    SimulatedUserFontManager manager_{scheduler_, fileSystem_};
 };
 
 class LinuxSubject final : public Subject {
