@@ -1,5 +1,7 @@
 #include "platform/simulated/simulated_user_font_manager.h"
 
+#include "platform/file_url.h"
+
 #include <algorithm>
 #include <cstdio>
 #include <set>
@@ -26,12 +28,6 @@ std::string providerDirectoryOf(std::string_view path)
     path.remove_prefix(fontFiles.size());
     const auto end = path.find('/');
     return std::string(end == std::string_view::npos ? "" : path.substr(0, end));
-}
-
-std::string pathOf(std::string_view url)
-{
-    constexpr std::string_view scheme = "file://";
-    return std::string(url.starts_with(scheme) ? url.substr(scheme.size()) : url);
 }
 
 bool standsForItself(char c)
@@ -116,7 +112,8 @@ void SimulatedUserFontManager::enableOrDisablePersistentURLs(std::vector<std::st
     start([this, urls = std::move(urls), enabled, completion = std::move(completion)] {
         const auto error = change([&](PropertyList::Dictionary& entries) -> FontManagerError {
             for (const auto& url : urls) {
-                const auto found = entries.find(pathOf(url));
+                const auto path = pathFromFileUrl(url);
+                const auto found = path ? entries.find(*path) : entries.end();
                 if (found == entries.end()) {
                     return url + " is not registered";
                 }
