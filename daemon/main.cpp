@@ -6,6 +6,7 @@
 #include "platform/linux/event_pool.h"
 #include "platform/linux/extension_tokens.h"
 #include "platform/linux/file_access_broker.h"
+#include "platform/linux/linux_analytics.h"
 #include "platform/linux/linux_application_registry.h"
 #include "platform/linux/linux_clock.h"
 #include "platform/linux/linux_code_signing.h"
@@ -13,6 +14,8 @@
 #include "platform/linux/linux_ipc.h"
 #include "platform/linux/linux_log.h"
 #include "platform/linux/linux_preferences.h"
+#include "platform/linux/linux_process_lifecycle.h"
+#include "platform/linux/linux_remote_alerts.h"
 #include "platform/linux/linux_sandbox.h"
 #include "platform/linux/linux_work_queues.h"
 #include "platform/linux/process_inspection.h"
@@ -56,6 +59,9 @@ struct LinuxServices {
     LinuxFileSystem fileSystem{root};
     LinuxApplicationRegistry applicationRegistry{root, log};
     LinuxUserFontManager userFontManager;
+    LinuxProcessLifecycle processLifecycle;
+    LinuxRemoteAlerts remoteAlerts{log};
+    LinuxAnalytics analytics;
 
     ConfinementProbe probe;
     SignatureStore signatures{root, log};
@@ -105,6 +111,9 @@ void run(const Options& options)
                              .log = services.log,
                              .applicationRegistry = services.applicationRegistry,
                              .userFontManager = services.userFontManager,
+                             .processLifecycle = services.processLifecycle,
+                             .remoteAlerts = services.remoteAlerts,
+                             .analytics = services.analytics,
                              .isInternalBuild = options.isInternalBuild};
 
     logProcessIdentity(services.log);

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "platform/analytics.h"
 #include "platform/application_registry.h"
 #include "platform/clock.h"
 #include "platform/code_signing.h"
@@ -7,6 +8,8 @@
 #include "platform/ipc.h"
 #include "platform/log.h"
 #include "platform/preferences.h"
+#include "platform/process_lifecycle.h"
+#include "platform/remote_alert.h"
 #include "platform/sandbox.h"
 #include "platform/user_font_manager.h"
 #include "platform/work_queues.h"
@@ -53,6 +56,9 @@ struct Platform {
     Log& log;
     ApplicationRegistry& applicationRegistry;
     TYUserFontManager& userFontManager;
+    ProcessLifecycle& processLifecycle;
+    RemoteAlerts& remoteAlerts;
+    Analytics& analytics;
     /// The internal-build query: whether this is an internal build of the system.
     bool isInternalBuild = false;
 

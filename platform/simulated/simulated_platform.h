@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/platform.h"
+#include "platform/simulated/simulated_analytics.h"
 #include "platform/simulated/simulated_application_registry.h"
 #include "platform/simulated/simulated_clock.h"
 #include "platform/simulated/simulated_code_signing.h"
@@ -8,7 +9,9 @@
 #include "platform/simulated/simulated_ipc.h"
 #include "platform/simulated/simulated_log.h"
 #include "platform/simulated/simulated_preferences.h"
+#include "platform/simulated/simulated_process_lifecycle.h"
 #include "platform/simulated/simulated_processes.h"
+#include "platform/simulated/simulated_remote_alerts.h"
 #include "platform/simulated/simulated_sandbox.h"
 #include "platform/simulated/simulated_scheduler.h"
 #include "platform/simulated/simulated_user_font_manager.h"
@@ -63,14 +66,18 @@ public:
     SimulatedFileSystem fileSystem;
     SimulatedApplicationRegistry applicationRegistry;
     SimulatedUserFontManager userFontManager{scheduler, fileSystem};
+    SimulatedProcessLifecycle processLifecycle{processes};
+    SimulatedAnalytics analytics{scheduler};
 
 private:
     std::unique_ptr<SimulatedIpc> ownedIpc_ = std::make_unique<SimulatedIpc>(queues, log);
 
 public:
     SimulatedIpc& ipc = *ownedIpc_;
-    Platform platform{queues,      clock,      ipc, codeSigning,         sandbox,
-                      preferences, fileSystem, log, applicationRegistry, userFontManager};
+    SimulatedRemoteAlerts remoteAlerts{ipc};
+    Platform platform{queues,           clock,        ipc,      codeSigning,         sandbox,
+                      preferences,      fileSystem,   log,      applicationRegistry, userFontManager,
+                      processLifecycle, remoteAlerts, analytics};
 
 private:
     void runOn(std::shared_ptr<void> connection, Task<void> work);
