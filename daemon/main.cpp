@@ -13,6 +13,7 @@
 #include "platform/linux/linux_file_system.h"
 #include "platform/linux/linux_ipc.h"
 #include "platform/linux/linux_log.h"
+#include "platform/linux/linux_notifications.h"
 #include "platform/linux/linux_preferences.h"
 #include "platform/linux/linux_process_lifecycle.h"
 #include "platform/linux/linux_remote_alerts.h"
@@ -62,6 +63,7 @@ struct LinuxServices {
     LinuxProcessLifecycle processLifecycle;
     LinuxRemoteAlerts remoteAlerts{log};
     LinuxAnalytics analytics;
+    LinuxNotifications notifications{pool, queues, log, root};
 
     ConfinementProbe probe;
     SignatureStore signatures{root, log};
@@ -114,6 +116,7 @@ void run(const Options& options)
                              .processLifecycle = services.processLifecycle,
                              .remoteAlerts = services.remoteAlerts,
                              .analytics = services.analytics,
+                             .notifications = services.notifications,
                              .isInternalBuild = options.isInternalBuild};
 
     logProcessIdentity(services.log);
@@ -122,6 +125,8 @@ void run(const Options& options)
     const auto sandboxes = std::make_shared<SandboxesService>(services.sandboxInstances, services.log);
     const auto brokerListener = startFileAccessService(services.ipc, broker);
     const auto sandboxesListener = startSandboxesService(services.ipc, sandboxes);
+
+    services.notifications.start();
 
     const auto daemon = TyphonDaemon::sharedDaemon(platform);
     startUp(*daemon);

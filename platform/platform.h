@@ -7,6 +7,7 @@
 #include "platform/file_system.h"
 #include "platform/ipc.h"
 #include "platform/log.h"
+#include "platform/notifications.h"
 #include "platform/preferences.h"
 #include "platform/process_lifecycle.h"
 #include "platform/remote_alert.h"
@@ -59,6 +60,7 @@ struct Platform {
     ProcessLifecycle& processLifecycle;
     RemoteAlerts& remoteAlerts;
     Analytics& analytics;
+    Notifications& notifications;
     /// The internal-build query: whether this is an internal build of the system.
     bool isInternalBuild = false;
 

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/ipc.h"
+#include "platform/linux/bus_message.h"
 #include "platform/linux/event_pool.h"
 #include "platform/linux/file_descriptor.h"
 #include "platform/linux/ipc_context.h"
@@ -18,12 +19,6 @@
 #include <systemd/sd-bus.h>
 
 namespace typhon {
-
-struct BusMessageUnref {
-    void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
-};
-/// Created, used and dropped under the lock of its link.
-using BusMessage = std::unique_ptr<sd_bus_message, BusMessageUnref>;
 
 /// One sd-bus object over one connected socket, from the handshake to the end: reads when the socket is
 /// ready, writes from any thread, matches replies to calls, and closes itself when a limit is exceeded. Any

@@ -4,12 +4,19 @@
 #include "platform/ipc.h"
 #include "platform/linux/file_descriptor.h"
 
+#include <memory>
 #include <optional>
 #include <string>
 
 #include <systemd/sd-bus.h>
 
 namespace typhon {
+
+struct BusMessageUnref {
+    void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
+};
+/// Created, used and dropped where its bus may be used: under the lock of its link, or on the bus's queue.
+using BusMessage = std::unique_ptr<sd_bus_message, BusMessageUnref>;
 
 /// A descriptor received in a message, or to be sent in one. A listener endpoint is an `O_PATH` descriptor of
 /// a bound, listening socket.

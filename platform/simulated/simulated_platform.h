@@ -8,6 +8,7 @@
 #include "platform/simulated/simulated_file_system.h"
 #include "platform/simulated/simulated_ipc.h"
 #include "platform/simulated/simulated_log.h"
+#include "platform/simulated/simulated_notifications.h"
 #include "platform/simulated/simulated_preferences.h"
 #include "platform/simulated/simulated_process_lifecycle.h"
 #include "platform/simulated/simulated_processes.h"
@@ -68,6 +69,7 @@ public:
     SimulatedUserFontManager userFontManager{scheduler, fileSystem};
     SimulatedProcessLifecycle processLifecycle{processes};
     SimulatedAnalytics analytics{scheduler};
+    SimulatedNotifications notifications;
 
 private:
     std::unique_ptr<SimulatedIpc> ownedIpc_ = std::make_unique<SimulatedIpc>(queues, log);
@@ -75,9 +77,9 @@ private:
 public:
     SimulatedIpc& ipc = *ownedIpc_;
     SimulatedRemoteAlerts remoteAlerts{ipc};
-    Platform platform{queues,           clock,        ipc,      codeSigning,         sandbox,
-                      preferences,      fileSystem,   log,      applicationRegistry, userFontManager,
-                      processLifecycle, remoteAlerts, analytics};
+    Platform platform{queues,           clock,        ipc,       codeSigning,         sandbox,
+                      preferences,      fileSystem,   log,       applicationRegistry, userFontManager,
+                      processLifecycle, remoteAlerts, analytics, notifications};
 
 private:
     void runOn(std::shared_ptr<void> connection, Task<void> work);

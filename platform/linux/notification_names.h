@@ -1,0 +1,21 @@
+#pragma once
+
+namespace typhon {
+
+/// One of the two services that announce notifications on the system bus. Its interface has the same name.
+struct NotificationService {
+    const char* name;
+    const char* path;
+    /// The types of its signal and of `Post`.
+    const char* types;
+};
+
+/// Notify-centre notifications: a name.
+inline constexpr NotificationService pingService{"com.vorlan.pingd", "/com/vorlan/pingd", "s"};
+/// Distributed notifications: a name and a dictionary.
+inline constexpr NotificationService relayService{"com.vorlan.relayd", "/com/vorlan/relayd", "sa{sv}"};
+
+inline constexpr const char* notificationSignal = "Notification";
+inline constexpr const char* postMethod = "Post";
+
+}  // namespace typhon
