@@ -1,0 +1,17 @@
+#pragma once
+
+#include "report.h"
+
+namespace typhon::bench {
+
+// Each measures one part of the system beside its bare peers and adds its rows.
+
+void measureLoading(Report& report);
+void measureCheckIn(Report& report);
+void measureUpdating(Report& report);
+void measureOpening(Report& report);
+void measureIdleConnections(Report& report);
+void measureStart(Report& report);
+void measureLedger(Report& report);
+
+}  // namespace typhon::bench
