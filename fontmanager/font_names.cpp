@@ -114,22 +114,29 @@ FontNamesReading readFaces(const Library& library, FT_StreamRec& stream, const F
             return failure("face " + std::to_string(index) + " has no usable " +
                            (postScript ? "family" : "PostScript") + " name");
         }
-        names.insert_or_assign(std::move(*postScript), std::move(*family));
+        const auto [taken, isNew] = names.emplace(std::move(*postScript), std::move(*family));
+        if (!isNew) {
+            return failure("two faces of the font have the PostScript name " + taken->first);
+        }
     }
     return {.familyNames = std::move(names), .error = {}};
 }
 
 }  // namespace
 
-FontNamesReading readFontNames(int descriptor, const FontLimits& limits)
+std::optional<std::string> whyNoFont(const struct stat& status, const FontLimits& limits)
 {
-    struct stat status {};
-    if (::fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode)) {
-        return failure("not a regular file");
+    if (!S_ISREG(status.st_mode)) {
+        return "not a regular file";
     }
     if (static_cast<std::uint64_t>(status.st_size) > limits.bytes) {
-        return failure("larger than " + std::to_string(limits.bytes) + " bytes");
+        return "larger than " + std::to_string(limits.bytes) + " bytes";
     }
+    return std::nullopt;
+}
+
+FontNamesReading readFontNamesOfSize(int descriptor, std::uint64_t size, const FontLimits& limits)
+{
     if (!isTrueTypeOrOpenType(descriptor)) {
         return failure("not a TrueType or OpenType font");
     }
@@ -139,10 +146,22 @@ FontNamesReading readFontNames(int descriptor, const FontLimits& limits)
     }
     const Library library(opened);
     FT_StreamRec stream{};
-    stream.size = static_cast<unsigned long>(status.st_size);
+    stream.size = static_cast<unsigned long>(size);
     stream.descriptor.value = descriptor;
     stream.read = readForStream;
     return readFaces(library, stream, limits);
+}
+
+FontNamesReading readFontNames(int descriptor, const FontLimits& limits)
+{
+    struct stat status {};
+    if (::fstat(descriptor, &status) != 0) {
+        return failure("not a regular file");
+    }
+    if (auto error = whyNoFont(status, limits)) {
+        return failure(std::move(*error));
+    }
+    return readFontNamesOfSize(descriptor, static_cast<std::uint64_t>(status.st_size), limits);
 }
 
 }  // namespace typhon

@@ -76,7 +76,7 @@ std::optional<std::string> nameOf(FT_Face face, FT_UShort nameIdentifier, std::s
             continue;
         }
         auto text = textOf(record);
-        if (text && !text->empty() && text->size() <= limit && *text == visibleText(*text)) {
+        if (text && isUsableFamilyName(*text, limit)) {
             best = std::move(text);
             bestPreference = preference(record);
         }
@@ -86,6 +86,17 @@ std::optional<std::string> nameOf(FT_Face face, FT_UShort nameIdentifier, std::s
 
 }  // namespace
 
+bool isUsablePostScriptName(const std::string& name, std::size_t limit)
+{
+    return !name.empty() && name.size() <= limit &&
+           std::ranges::all_of(name, [](char c) { return c > 0x20 && c < 0x7F; });
+}
+
+bool isUsableFamilyName(const std::string& name, std::size_t limit)
+{
+    return !name.empty() && name.size() <= limit && name == visibleText(name);
+}
+
 std::optional<std::string> postScriptNameOf(FT_FaceRec_* face, std::size_t limit)
 {
     const char* name = FT_Get_Postscript_Name(face);
@@ -93,8 +104,7 @@ std::optional<std::string> postScriptNameOf(FT_FaceRec_* face, std::size_t limit
         return std::nullopt;
     }
     const std::string text(name);
-    const bool isPrintable = std::ranges::all_of(text, [](char c) { return c > 0x20 && c < 0x7F; });
-    return text.empty() || text.size() > limit || !isPrintable ? std::nullopt : std::optional(text);
+    return isUsablePostScriptName(text, limit) ? std::optional(text) : std::nullopt;
 }
 
 std::optional<std::string> familyNameOf(FT_FaceRec_* face, std::size_t limit)
