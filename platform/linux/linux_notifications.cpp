@@ -34,8 +34,8 @@ void post(sd_bus* bus, const std::string& name, Log& log)
 }  // namespace
 
 LinuxNotifications::LinuxNotifications(EventPool& pool, WorkQueues& queues, Log& log,
-                                       const RootDirectory& root)
-    : log_(log), streams_(std::make_shared<NotificationStreams>(log)),
+                                       const RootDirectory& root, const TrustsUser& trusts)
+    : log_(log), streams_(std::make_shared<NotificationStreams>(trusts, log)),
       bus_(std::make_shared<SystemBus>(pool, queues, log, root.real(systemBusSocket)))
 {}
 

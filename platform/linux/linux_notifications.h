@@ -2,6 +2,7 @@
 
 #include "platform/linux/event_pool.h"
 #include "platform/linux/root_directory.h"
+#include "platform/linux/trusted_users.h"
 #include "platform/log.h"
 #include "platform/notifications.h"
 #include "platform/work_queues.h"
@@ -17,12 +18,13 @@ class SystemBus;
 
 /// The system's notifications, as signals on the system bus (under a scratch root: the bus that listens in
 /// that folder). An event is taken from whoever owns the announcing service's name at present and runs as
-/// this process's user or root, from nobody else. Without a bus nothing arrives and what is posted is
+/// a trusted user, from nobody else. Without a bus nothing arrives and what is posted is
 /// dropped; the connection is made as soon as the bus is there.
 class LinuxNotifications final : public Notifications {
 public:
     /// The services outlive everything here, the work on their queues included.
-    LinuxNotifications(EventPool& pool, WorkQueues& queues, Log& log, const RootDirectory& root);
+    LinuxNotifications(EventPool& pool, WorkQueues& queues, Log& log, const RootDirectory& root,
+                       const TrustsUser& trusts = isRootOrOwnUser);
     ~LinuxNotifications() override;
 
     /// Begins to connect. Once; before it nothing arrives and what is posted is dropped.

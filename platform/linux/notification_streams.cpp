@@ -1,7 +1,6 @@
 #include "platform/linux/notification_streams.h"
 
 #include "platform/linux/bus_calls.h"
-#include "platform/linux/bus_message_codec.h"
 #include "platform/notifications.h"
 
 #include <optional>
@@ -14,14 +13,6 @@ namespace {
 
 /// Events kept while it is being asked who announces them.
 constexpr std::size_t mostHeld = 64;
-
-/// What one notification may hold: they are words and short lists.
-constexpr MessageLimits notificationLimits{.values = 1U << 14,
-                                           .depth = 32,
-                                           .bytes = 1U << 20,
-                                           .descriptors = 0,
-                                           .memoryFileBytes = 0,
-                                           .memoryFileValues = 0};
 
 std::optional<PropertyList> eventOf(sd_bus_message* signal, const char* types)
 {
@@ -39,8 +30,8 @@ std::optional<PropertyList> eventOf(sd_bus_message* signal, const char* types)
 
 }  // namespace
 
-NotificationStream::NotificationStream(const NotificationService& service, Log& log)
-    : service_(service), log_(log)
+NotificationStream::NotificationStream(const NotificationService& service, TrustsUser trusts, Log& log)
+    : service_(service), trusts_(std::move(trusts)), log_(log)
 {}
 
 void NotificationStream::setHandler(std::shared_ptr<WorkQueue> queue, Handler handler)
@@ -55,7 +46,7 @@ void NotificationStream::connected(sd_bus* bus)
     const auto signals = std::string("type='signal',sender='") + service_.name + "',path='" + service_.path +
                          "',interface='" + service_.name + "',member='" + notificationSignal + "'";
     callBusDriver(bus, "AddMatch", signals, [](sd_bus_message*) {});
-    owner_ = std::make_shared<TrustedBusName>(service_.name, [weak = weak_from_this()] {
+    owner_ = std::make_shared<TrustedBusName>(service_.name, trusts_, [weak = weak_from_this()] {
         if (const auto self = weak.lock()) {
             self->ownerDecided();
         }
@@ -113,9 +104,9 @@ void NotificationStream::deliver(PropertyList event)
     }
 }
 
-NotificationStreams::NotificationStreams(Log& log)
-    : ping_(std::make_shared<NotificationStream>(pingService, log)),
-      relay_(std::make_shared<NotificationStream>(relayService, log))
+NotificationStreams::NotificationStreams(const TrustsUser& trusts, Log& log)
+    : ping_(std::make_shared<NotificationStream>(pingService, trusts, log)),
+      relay_(std::make_shared<NotificationStream>(relayService, trusts, log))
 {}
 
 NotificationStream* NotificationStreams::streamOf(const std::string& name)

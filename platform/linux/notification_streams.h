@@ -3,6 +3,7 @@
 #include "platform/linux/notification_names.h"
 #include "platform/linux/system_bus.h"
 #include "platform/linux/trusted_bus_name.h"
+#include "platform/linux/trusted_users.h"
 #include "platform/log.h"
 #include "platform/property_list.h"
 #include "platform/work_queue.h"
@@ -22,7 +23,7 @@ class NotificationStream : public std::enable_shared_from_this<NotificationStrea
 public:
     using Handler = std::function<void(PropertyList event)>;
 
-    NotificationStream(const NotificationService& service, Log& log);
+    NotificationStream(const NotificationService& service, TrustsUser trusts, Log& log);
 
     /// Any thread.
     void setHandler(std::shared_ptr<WorkQueue> queue, Handler handler);
@@ -38,6 +39,7 @@ private:
     void deliver(PropertyList event);
 
     const NotificationService service_;
+    const TrustsUser trusts_;
     Log& log_;
 
     std::mutex mutex_;
@@ -54,7 +56,7 @@ private:
 /// Both streams on one connection.
 class NotificationStreams final : public SystemBusUser {
 public:
-    explicit NotificationStreams(Log& log);
+    NotificationStreams(const TrustsUser& trusts, Log& log);
 
     /// Null for a stream that does not exist.
     NotificationStream* streamOf(const std::string& name);

@@ -42,6 +42,9 @@ public:
     /// Begins to connect. Once.
     void start(std::weak_ptr<SystemBusUser> user);
 
+    /// Where everything about the connection happens.
+    const std::shared_ptr<WorkQueue>& queue() const { return queue_; }
+
     /// Runs `work` on the connection's queue if there is a connection, also while its handshake goes on; else
     /// drops it.
     void withBus(std::function<void(sd_bus* bus)> work);

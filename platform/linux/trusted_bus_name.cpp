@@ -9,27 +9,24 @@
 #include <cstdint>
 #include <utility>
 
-#include <unistd.h>
-
 namespace typhon {
 
 namespace {
 
 constexpr const char* busDriver = "org.freedesktop.DBus";
 
-bool isTrustedUser(sd_bus_message* reply)
+/// False also when the bus does not know the user.
+bool isTrusted(sd_bus_message* reply, const TrustsUser& trusts)
 {
     std::uint32_t user = 0;
-    if (sd_bus_message_is_method_error(reply, nullptr) > 0 || sd_bus_message_read(reply, "u", &user) < 0) {
-        return false;
-    }
-    return user == 0 || user == ::geteuid();
+    return sd_bus_message_is_method_error(reply, nullptr) <= 0 &&
+           sd_bus_message_read(reply, "u", &user) >= 0 && trusts(user);
 }
 
 }  // namespace
 
-TrustedBusName::TrustedBusName(std::string name, std::function<void()> decided)
-    : name_(std::move(name)), decided_(std::move(decided))
+TrustedBusName::TrustedBusName(std::string name, TrustsUser trusts, std::function<void()> decided)
+    : name_(std::move(name)), trusts_(std::move(trusts)), decided_(std::move(decided))
 {}
 
 void TrustedBusName::follow(sd_bus* bus)
@@ -85,15 +82,15 @@ void TrustedBusName::setOwner(sd_bus* bus, std::string_view owner)
     callBusDriver(bus, "GetConnectionUnixUser", owner_,
                   [weak = weak_from_this(), asked = owner_](sd_bus_message* reply) {
                       if (const auto self = weak.lock()) {
-                          self->decide(asked, isTrustedUser(reply));
+                          self->decide(asked, isTrusted(reply, self->trusts_));
                       }
                   });
 }
 
-void TrustedBusName::decide(const std::string& asked, bool isTrusted)
+void TrustedBusName::decide(const std::string& asked, bool isTrustedOwner)
 {
     if (asked == owner_) {
-        ownersStanding_ = isTrusted ? Standing::trusted : Standing::stranger;
+        ownersStanding_ = isTrustedOwner ? Standing::trusted : Standing::stranger;
         decided_();
     }
 }

@@ -1,17 +1,18 @@
 #pragma once
 
+#include "platform/linux/trusted_users.h"
+
 #include <functional>
 #include <memory>
 #include <string>
 #include <string_view>
 
-#include <sys/types.h>
 #include <systemd/sd-bus.h>
 
 namespace typhon {
 
-/// Follows who owns a well-known name on a bus, and whether that owner runs as a user it may run as: this
-/// process's own, or root. On the bus's queue only.
+/// Follows who owns a well-known name on a bus, and whether that owner runs as a user it may run as. On the
+/// bus's queue only.
 class TrustedBusName : public std::enable_shared_from_this<TrustedBusName> {
 public:
     enum class Standing {
@@ -23,7 +24,7 @@ public:
     };
 
     /// `decided` is called whenever the standing of the present owner has become known, or it has gone.
-    TrustedBusName(std::string name, std::function<void()> decided);
+    TrustedBusName(std::string name, TrustsUser trusts, std::function<void()> decided);
 
     /// Begins anew on a fresh connection: has the bus report changes of the owner, and asks for the present
     /// one.
@@ -40,9 +41,10 @@ public:
 
 private:
     void setOwner(sd_bus* bus, std::string_view owner);
-    void decide(const std::string& asked, bool isTrusted);
+    void decide(const std::string& asked, bool isTrustedOwner);
 
     const std::string name_;
+    const TrustsUser trusts_;
     const std::function<void()> decided_;
     /// The owner's unique name; empty for none.
     std::string owner_;

@@ -1,0 +1,72 @@
+#include "platform/linux/event_pool.h"
+#include "platform/linux/linux_log.h"
+#include "platform/linux/linux_work_queues.h"
+#include "platform/linux/root_directory.h"
+#include "platform/linux/system_bus.h"
+#include "tools/relayd/notification_relay.h"
+
+#include <csignal>
+#include <cstdlib>
+#include <filesystem>
+#include <map>
+#include <memory>
+#include <string>
+
+#include <CLI/CLI.hpp>
+
+// Nothing here is ever torn down: the process runs until the system stops it. Without a bus it waits for one.
+
+namespace typhon {
+
+namespace {
+
+struct Options {
+    std::string root;
+    LogLevel logLevel = LogLevel::defaultLevel;
+};
+
+Options parsed(int argc, char** argv)
+{
+    Options options;
+    CLI::App app{"Announces the system's notifications on the system bus, and the removal of applications."};
+    app.name("typhon-relayd");
+    app.add_option("--root", options.root, "Put every path of the system under this folder")
+        ->type_name("DIR");
+    const std::map<std::string, LogLevel> levels{
+        {"debug", LogLevel::debug}, {"default", LogLevel::defaultLevel}, {"error", LogLevel::error}};
+    app.add_option("--log-level", options.logLevel, "Least level that is logged: debug, default or error")
+        ->type_name("LEVEL")
+        ->transform(CLI::Transformer(levels));
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& error) {
+        std::exit(app.exit(error) == 0 ? 0 : 2);
+    }
+    if (!options.root.empty()) {
+        options.root = std::filesystem::absolute(options.root).lexically_normal().string();
+    }
+    return options;
+}
+
+void run(const Options& options)
+{
+    static const RootDirectory root(options.root);
+    static LinuxLog log(options.logLevel);
+    static EventPool pool(EventPool::Options{.minimumThreads = 1, .maximumThreads = 4});
+    static LinuxWorkQueues queues(pool);
+    static const auto relay = std::make_shared<NotificationRelay>(isRootOrOwnUser, log);
+    static const auto bus = std::make_shared<SystemBus>(pool, queues, log, root.real(systemBusSocket));
+    bus->start(relay);
+    queues.runMainLoop();
+}
+
+}  // namespace
+
+}  // namespace typhon
+
+int main(int argc, char** argv)
+{
+    const auto options = typhon::parsed(argc, argv);
+    std::signal(SIGPIPE, SIG_IGN);
+    typhon::run(options);
+}
