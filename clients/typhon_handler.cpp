@@ -1,5 +1,8 @@
 #include "clients/typhon_handler.h"
 
+#include "clients/sluice_error.h"
+#include "protocol/wire.h"
+
 namespace typhon {
 
 TyphonHandler::TyphonHandler(std::shared_ptr<TyphonServer> typhonDaemon) : server_(std::move(typhonDaemon)) {}
@@ -25,16 +28,17 @@ Task<void> TyphonHandler::checkin(OptionalDictionaryReply reply)
         reply(std::nullopt);
         co_return;
     }
+    if (isFontProvider_) {
+        // Before the first change can come, which a provider without a name would miss.
+        const std::lock_guard lock(mutex_);
+        processIdentifier_ = capabilities.identifier;
+    }
     daemon->notificationCenter().addObserver(shared_from_this(), "fontChanged", &TyphonHandler::fontChanged);
     auto answering = daemon->perClientFontInfo().setupUserInstalledFontsFor(
         token, token, capabilities.allowEnumerate, capabilities.allowUserFonts,
         capabilities.allowInstallation, capabilities.identifier, std::move(reply));
     co_await std::move(answering);
     TYLog_Debug(daemon->log(), "connected: " + capabilities.identifier.value_or("(null)"));
-    if (isFontProvider_) {
-        const std::lock_guard lock(mutex_);
-        processIdentifier_ = capabilities.identifier;
-    }
 }
 
 Task<void> TyphonHandler::checkinForFontPicker(OptionalDictionaryReply reply)
@@ -109,20 +113,24 @@ Task<void> TyphonHandler::resetIssuedFontsFor(std::string identifier, EmptyReply
     return server()->resetIssuedFontsFor(std::move(identifier), std::move(reply));
 }
 
-Task<void> TyphonHandler::checkinForSilkpageProcess(std::shared_ptr<ListenerEndpoint> endpoint,
-                                                    EmptyReply reply)
-{
-    return server()->checkinForSilkpageProcess(std::move(endpoint), std::move(reply));
-}
-
 bool TyphonHandler::isProcessIdentifierToIgnore(const std::optional<std::string>& identifier)
 {
     return identifier == "com.vorlan.Typhon.UserFontManager";
 }
 
-void TyphonHandler::fontChanged(const PropertyList& /*notification*/)
+void TyphonHandler::fontChanged(const PropertyList& notification)
 {
-    // Checked-in clients are registered from the start; nothing is sent to them yet.
+    const auto daemon = server();
+    const auto connection = clientConnection();
+    // Intended: a client whose connection is gone is worked for all the same, and nothing delivered to it.
+    const auto share = daemon->fontChangeBroadcast()
+                           .sharesIn(notification)
+                           ->shareOf({connection ? connection->auditToken() : AuditToken{},
+                                      hasEnumerationEntitlement_, isFontProvider_, processIdentifier()});
+    if (share && connection) {
+        connection->send(wire::fontAddedInfo.interface, wire::fontAddedInfo.member, *share,
+                         sluiceErrorHandler(daemon->log(), "fontChanged:"));
+    }
 }
 
 std::optional<std::string> TyphonHandler::processIdentifier() const

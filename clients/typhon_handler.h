@@ -26,6 +26,8 @@ public:
     Task<void> checkin(OptionalDictionaryReply reply) override;
     Task<void> checkinForFontPicker(OptionalDictionaryReply reply) override;
     Task<void> sendFonts(PropertyList::Array fonts, EmptyReply reply) override;
+    Task<void> checkinForSilkpageProcess(std::shared_ptr<ListenerEndpoint> endpoint,
+                                         EmptyReply reply) override;
 
     // Passed on to the daemon unchanged.
     Task<void> requestFonts(PropertyList::Array requests, DictionaryReply reply) override;
@@ -36,13 +38,12 @@ public:
     Task<void> scheduleFontFilesDeletion(std::vector<std::string> paths) override;
     Task<void> synchronizeFontAssets(std::vector<std::string> paths, OutcomeReply reply) override;
     Task<void> resetIssuedFontsFor(std::string identifier, EmptyReply reply) override;
-    Task<void> checkinForSilkpageProcess(std::shared_ptr<ListenerEndpoint> endpoint,
-                                         EmptyReply reply) override;
 
     /// `isProcessIdentifierToIgnore:`. True for the font-registry library's own helper, which is no client.
     static bool isProcessIdentifierToIgnore(const std::optional<std::string>& identifier);
 
-    /// `fontChanged:`. The observer of the notification "fontChanged", from check-in until destruction.
+    /// `fontChanged:`. The observer of the notification "fontChanged", from check-in until destruction: sends
+    /// the client its share in the change. On `mainHandlerQueue`.
     void fontChanged(const PropertyList& notification);
 
     bool hasEnumerationEntitlement() const { return hasEnumerationEntitlement_; }
@@ -55,11 +56,15 @@ public:
     void setClientConnection(std::shared_ptr<Connection> connection);
     std::shared_ptr<TyphonServer> server() const;
     void setServer(std::shared_ptr<TyphonServer> server);
-    /// The connections to the client's web-content processes, or null.
+    /// The connections to the client's web-content processes, or null, which it stays.
     std::optional<std::vector<std::shared_ptr<Connection>>> webcontentProcessConnections() const;
+    /// `addWebContentProcessConnection:`
+    void addWebContentProcessConnection(std::shared_ptr<Connection> connection);
 
 private:
     PropertyList fontPickerReply(const AuditToken& token);
+    void watchWebContentProcessConnection(const std::shared_ptr<Connection>& connection);
+    void removeWebContentProcessConnection(const std::shared_ptr<Connection>& connection);
 
     std::atomic<bool> hasEnumerationEntitlement_ = false;
     std::atomic<bool> hasFontAccessEntitlement_ = false;

@@ -1,7 +1,9 @@
 #pragma once
 
+#include "clients/font_change_broadcast.h"
 #include "clients/notification_center.h"
 #include "platform/audit_token.h"
+#include "platform/ipc.h"
 #include "platform/log.h"
 #include "platform/work_queue.h"
 #include "protocol/typhon_daemon_protocol.h"
@@ -35,7 +37,10 @@ public:
 
     virtual PerClientFontInfo& perClientFontInfo() = 0;
     virtual NotificationCenter& notificationCenter() = 0;
+    virtual FontChangeBroadcast& fontChangeBroadcast() = 0;
     virtual WorkQueue& mainHandlerQueue() = 0;
+    virtual Ipc& ipc() = 0;
+    /// Outlives everything.
     virtual Log& log() = 0;
 };
 

@@ -143,12 +143,12 @@ constexpr std::array table{
     DispatchedOperation{wire::checkinForFontPicker, everyone, served, checkinForFontPicker},
     DispatchedOperation{wire::requestFonts, everyone, toCome, requestFonts},
     DispatchedOperation{wire::requestFontsForClient, fontPicker, toCome, requestFontsForClient},
-    DispatchedOperation{wire::fontChanged, everyone, toCome, fontChanged},
+    DispatchedOperation{wire::fontChanged, everyone, served, fontChanged},
     DispatchedOperation{wire::updatingUserFonts, everyone, served, updatingUserFonts},
     DispatchedOperation{wire::scheduleFontFilesDeletion, everyone, toCome, scheduleFontFilesDeletion},
     DispatchedOperation{wire::synchronizeFontAssets, everyone, toCome, synchronizeFontAssets},
     DispatchedOperation{wire::resetIssuedFontsFor, everyone, served, resetIssuedFontsFor},
-    DispatchedOperation{wire::checkinForSilkpageProcess, everyone, toCome, checkinForSilkpageProcess},
+    DispatchedOperation{wire::checkinForSilkpageProcess, everyone, served, checkinForSilkpageProcess},
     DispatchedOperation{wire::sendFonts, everyone, served, sendFonts},
 };
 

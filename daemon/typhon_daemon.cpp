@@ -36,7 +36,9 @@ TyphonDaemon::TyphonDaemon(Platform& platform)
           {[this](const AuditToken& token) { return clientCapabilities_.isAuditTokenSandboxed(token); },
            [this](const std::string& identifier) {
                return issuedPathsLedger_.issuedFontFilePathsForIdentifier(identifier);
-           }})
+           }}),
+      fontChangeBroadcast_(platform, userFontRegistry_, perClientFontInfo_, notificationCenter_,
+                           *mainHandlerQueue_)
 {}
 
 void TyphonDaemon::setupForSluiceService()
@@ -107,6 +109,11 @@ bool TyphonDaemon::isCurrentConnectionFontPicker()
     return clientCapabilities_.isCurrentConnectionFontPicker();
 }
 
+Task<void> TyphonDaemon::fontChanged(PropertyList change, EmptyReply reply)
+{
+    return fontChangeBroadcast_.fontChanged(std::move(change), std::move(reply));
+}
+
 Task<void> TyphonDaemon::updatingUserFonts(EmptyReply reply)
 {
     return userFontUpdates_.updatingUserFonts(std::move(reply));
@@ -141,11 +148,6 @@ Task<void> TyphonDaemon::requestFonts(std::string /*postScriptName*/,
                                       std::shared_ptr<ListenerEndpoint> /*forClient*/, BooleanReply /*reply*/)
 {
     return doesNotRecognizeSelector("requestFonts:forClient:reply:");
-}
-
-Task<void> TyphonDaemon::fontChanged(PropertyList /*change*/, EmptyReply /*reply*/)
-{
-    return doesNotRecognizeSelector("fontChanged:reply:");
 }
 
 Task<void> TyphonDaemon::scheduleFontFilesDeletion(std::vector<std::string> /*paths*/)

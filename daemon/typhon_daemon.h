@@ -55,12 +55,15 @@ public:
     bool isCurrentConnectionFontPicker() override;
     PerClientFontInfo& perClientFontInfo() override { return perClientFontInfo_; }
     NotificationCenter& notificationCenter() override { return notificationCenter_; }
+    FontChangeBroadcast& fontChangeBroadcast() override { return fontChangeBroadcast_; }
     WorkQueue& mainHandlerQueue() override { return *mainHandlerQueue_; }
+    Ipc& ipc() override { return platform_.ipc; }
     Log& log() override { return platform_.log; }
     ClientCapabilities& clientCapabilities() { return clientCapabilities_; }
     UserFontRegistry& userFontRegistry() { return userFontRegistry_; }
     IssuedPathsLedger& issuedPathsLedger() { return issuedPathsLedger_; }
 
+    Task<void> fontChanged(PropertyList change, EmptyReply reply) override;
     Task<void> updatingUserFonts(EmptyReply reply) override;
     Task<void> resetIssuedFontsFor(std::string identifier, EmptyReply reply) override;
 
@@ -72,7 +75,6 @@ public:
     Task<void> requestFonts(PropertyList::Array requests, DictionaryReply reply) override;
     Task<void> requestFonts(std::string postScriptName, std::shared_ptr<ListenerEndpoint> forClient,
                             BooleanReply reply) override;
-    Task<void> fontChanged(PropertyList change, EmptyReply reply) override;
     Task<void> scheduleFontFilesDeletion(std::vector<std::string> paths) override;
     Task<void> synchronizeFontAssets(std::vector<std::string> paths, OutcomeReply reply) override;
     Task<void> checkinForSilkpageProcess(std::shared_ptr<ListenerEndpoint> endpoint,
@@ -87,6 +89,7 @@ private:
     UserFontRegistry userFontRegistry_;
     IssuedPathsLedger issuedPathsLedger_;
     PerClientFontInfo perClientFontInfo_;
+    FontChangeBroadcast fontChangeBroadcast_;
     ScheduledFontDeletion scheduledFontDeletion_;
     ApplicationRemoval applicationRemoval_;
     AssetCatalogueEvents assetCatalogueEvents_;

@@ -27,14 +27,28 @@ PropertyList onlyPaths(const PropertyList& view, const std::set<std::string>& al
 
 /// The enabled entries in the provider's directory. Its files need no extension of their own: the provider
 /// gets one for the directory.
-PropertyList fontsOfProvider(const RegistrySnapshot& registry, const std::string& directoryName,
-                             const std::optional<std::set<std::string>>& allowed)
+PropertyList fontsOfProvider(const RegistrySnapshot& registry, const std::string& directoryName)
 {
     PropertyList::Dictionary fonts;
     for (const auto* item : registry.entriesInDirectoryNamed(directoryName)) {
         const auto& [path, entry] = *item;
-        if (!isDisabled(entry) && (!allowed || allowed->contains(path))) {
+        if (!isDisabled(entry)) {
             fonts.emplace_hint(fonts.end(), path, withoutDisabled(entry));
+        }
+    }
+    return fonts;
+}
+
+/// The same of the allowed paths only. Each is looked up: the provider may have any number of fonts.
+PropertyList fontsOfProvider(const RegistrySnapshot& registry, const std::string& directoryName,
+                             const std::set<std::string>& allowed)
+{
+    PropertyList::Dictionary fonts;
+    for (const auto& path : allowed) {
+        const auto* entry = registry.entry(path);
+        const bool isOwn = font_directories::nameOfDirectoryHolding(path) == directoryName;
+        if (entry != nullptr && isOwn && !isDisabled(*entry)) {
+            fonts.emplace_hint(fonts.end(), path, withoutDisabled(*entry));
         }
     }
     return fonts;
@@ -101,7 +115,8 @@ PerClientFontInfo::fontInfoForAuditToken(const AuditToken& /*token*/, bool withE
     if (!directoryName) {
         return {};
     }
-    auto fonts = fontsOfProvider(*registry, *directoryName, andFileFilters);
+    auto fonts = andFileFilters ? fontsOfProvider(*registry, *directoryName, *andFileFilters)
+                                : fontsOfProvider(*registry, *directoryName);
     if (foundFontDirectoryName != nullptr && !fonts.asDictionary()->empty()) {
         *foundFontDirectoryName = directoryName;
     }
