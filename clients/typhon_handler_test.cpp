@@ -19,7 +19,8 @@ public:
           registry(simulated.fileSystem, simulated.log, updates_),
           fontInfo_(simulated.platform, registry, *mainHandlerQueue_,
                     {[](const AuditToken&) { return true; },
-                     [](const std::string&) { return std::vector<std::string>{}; }})
+                     [](const std::string&) { return std::vector<std::string>{}; }}),
+          broadcast_(simulated.platform, registry, fontInfo_, center, *mainHandlerQueue_), ipc_(simulated.ipc)
     {}
 
     Capabilities capabilitiesFor(const AuditToken& token) override
@@ -30,7 +31,9 @@ public:
     bool isCurrentConnectionFontPicker() override { return isFontPicker; }
     PerClientFontInfo& perClientFontInfo() override { return fontInfo_; }
     NotificationCenter& notificationCenter() override { return center; }
+    FontChangeBroadcast& fontChangeBroadcast() override { return broadcast_; }
     WorkQueue& mainHandlerQueue() override { return *mainHandlerQueue_; }
+    Ipc& ipc() override { return ipc_; }
     Log& log() override { return log_; }
 
     Task<void> checkin(OptionalDictionaryReply) override { return note("checkin:"); }
@@ -74,11 +77,9 @@ public:
         reply();
         return note("resetIssuedFontsFor:reply: " + identifier);
     }
-    Task<void> checkinForSilkpageProcess(std::shared_ptr<ListenerEndpoint> endpoint,
-                                         EmptyReply reply) override
+    Task<void> checkinForSilkpageProcess(std::shared_ptr<ListenerEndpoint>, EmptyReply) override
     {
-        reply();
-        return note(endpoint ? "checkinForSilkpageProcess:reply:" : "checkinForSilkpageProcess:reply: null");
+        return note("checkinForSilkpageProcess:reply:");
     }
 
     Capabilities capabilities;
@@ -103,6 +104,8 @@ public:
 
 private:
     PerClientFontInfo fontInfo_;
+    FontChangeBroadcast broadcast_;
+    Ipc& ipc_;
 };
 
 class TyphonHandlerTest : public testing::Test {
@@ -204,6 +207,16 @@ TEST_F(TyphonHandlerTest, OnlyAProvidersIdentifierIsKept)
     EXPECT_EQ(handler->processIdentifier(), "com.example.app");
 }
 
+TEST_F(TyphonHandlerTest, AProviderHasItsNameBeforeItIsAnsweredSoThatItMissesNoChange)
+{
+    server->capabilities = {false, false, true, "com.example.app"};
+    std::optional<std::string> name;
+    simulated.runAs(client, handler->checkin([&](const std::optional<PropertyList>&) {
+        name = handler->processIdentifier();
+    }));
+    EXPECT_EQ(name, "com.example.app");
+}
+
 TEST_F(TyphonHandlerTest, TheFontRegistryHelperGetsNullAndNoRegistration)
 {
     server->capabilities = {true, true, true, "com.vorlan.Typhon.UserFontManager"};
@@ -282,14 +295,12 @@ TEST_F(TyphonHandlerTest, TheOtherOperationsAreForwardedWithTheirArgumentsAndRep
     simulated.runAs(client, handler->synchronizeFontAssets(
                                 {"/b"}, [&](bool, const std::optional<PropertyList>&) { ++replies; }));
     simulated.runAs(client, handler->resetIssuedFontsFor("com.example.app", [&] { ++replies; }));
-    simulated.runAs(client, handler->checkinForSilkpageProcess(endpoint, [&] { ++replies; }));
-    EXPECT_EQ(
-        server->received,
-        (std::vector<std::string>{
-            "requestFonts:reply: 2", "requestFonts:forClient:reply: Alpha-Regular", "fontChanged:reply: 1",
-            "updatingUserFonts:", "scheduleFontFilesDeletion: /a", "synchronizeFontAssets:reply: /b",
-            "resetIssuedFontsFor:reply: com.example.app", "checkinForSilkpageProcess:reply:"}));
-    EXPECT_EQ(replies, 7);
+    EXPECT_EQ(server->received,
+              (std::vector<std::string>{
+                  "requestFonts:reply: 2", "requestFonts:forClient:reply: Alpha-Regular",
+                  "fontChanged:reply: 1", "updatingUserFonts:", "scheduleFontFilesDeletion: /a",
+                  "synchronizeFontAssets:reply: /b", "resetIssuedFontsFor:reply: com.example.app"}));
+    EXPECT_EQ(replies, 6);
 }
 
 TEST_F(TyphonHandlerTest, AHandlerThatGoesIsUnregisteredAndSaysSo)

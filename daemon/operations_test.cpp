@@ -81,10 +81,8 @@ TEST_F(OperationsTest, TheOperationsToComeAreThese)
             toCome.insert(row.operation.member);
         }
     }
-    EXPECT_EQ(toCome,
-              (std::set<std::string>{"requestFonts_reply", "requestFonts_forClient_reply",
-                                     "fontChanged_reply", "scheduleFontFilesDeletion",
-                                     "synchronizeFontAssets_reply", "checkinForSilkpageProcess_reply"}));
+    EXPECT_EQ(toCome, (std::set<std::string>{"requestFonts_reply", "requestFonts_forClient_reply",
+                                             "scheduleFontFilesDeletion", "synchronizeFontAssets_reply"}));
 }
 
 TEST_F(OperationsTest, OperationsToComeAnswerNotSupported)
@@ -92,11 +90,8 @@ TEST_F(OperationsTest, OperationsToComeAnswerNotSupported)
     const Arguments list{PropertyList(PropertyList::Array{})};
     const Outcomes notSupported{ipc_errors::notSupported};
     EXPECT_EQ(outcomesOf(wire::requestFonts, list), notSupported);
-    EXPECT_EQ(outcomesOf(wire::fontChanged, {PropertyList()}), notSupported);
     EXPECT_EQ(outcomesOf(wire::scheduleFontFilesDeletion, list), notSupported);
     EXPECT_EQ(outcomesOf(wire::synchronizeFontAssets, list), notSupported);
-    const Arguments endpoint{simulated.ipc.anonymousListener()->endpoint()};
-    EXPECT_EQ(outcomesOf(wire::checkinForSilkpageProcess, endpoint), notSupported);
 }
 
 TEST_F(OperationsTest, RequestingFontsForAClientIsForTheFontPickerOnly)
@@ -120,6 +115,7 @@ TEST_F(OperationsTest, ServedOperationsAnswerOnce)
     const Outcomes one{"reply"};
     EXPECT_EQ(outcomesOf(wire::checkin), one);
     EXPECT_EQ(outcomesOf(wire::checkinForFontPicker), one);
+    EXPECT_EQ(outcomesOf(wire::fontChanged, {PropertyList()}), one);
     EXPECT_EQ(outcomesOf(wire::updatingUserFonts), one);
     EXPECT_EQ(outcomesOf(wire::resetIssuedFontsFor, {PropertyList("com.example.app")}), one);
 }
@@ -146,7 +142,6 @@ TEST_F(OperationsTest, TheDaemonItselfDoesNotKnowWhatItDoesNotImplement)
     EXPECT_TRUE(isUnknown(daemon->sendFonts({}, [] {})));
     EXPECT_TRUE(isUnknown(daemon->requestFonts({}, [](const PropertyList&) {})));
     EXPECT_TRUE(isUnknown(daemon->requestFonts("", nullptr, [](bool) {})));
-    EXPECT_TRUE(isUnknown(daemon->fontChanged({}, [] {})));
     EXPECT_TRUE(isUnknown(daemon->scheduleFontFilesDeletion({})));
     EXPECT_TRUE(
         isUnknown(daemon->synchronizeFontAssets({}, [](bool, const std::optional<PropertyList>&) {})));

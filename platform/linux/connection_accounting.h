@@ -12,7 +12,8 @@
 
 namespace typhon {
 
-/// Counts the accepted connections of every process and user. Any thread.
+/// Counts the connections of every process and user that it may make us hold: those accepted from it, and
+/// those made to its endpoints. Any thread.
 class ConnectionAccounting : public std::enable_shared_from_this<ConnectionAccounting> {
 public:
     ConnectionAccounting(unsigned perProcess, unsigned perUser) : perProcess_(perProcess), perUser_(perUser)

@@ -9,7 +9,8 @@ namespace typhon {
 
 /// What peers may cost. Whatever goes beyond is refused or closed, and logged once for each offender.
 struct IpcLimits {
-    /// Accepted connections of one process, and of all processes of one user.
+    /// Connections of one process, and of all processes of one user: accepted ones, and ones made to its
+    /// endpoints.
     unsigned connectionsPerProcess = 256;
     unsigned connectionsPerUser = 16384;
     /// Calls of one connection that were read and neither answered nor dropped, and the memory of their

@@ -107,7 +107,8 @@ std::shared_ptr<BusLink> LinuxConnection::usableLink()
             return link_;
         }
     }
-    auto link = connect();
+    std::unique_ptr<ConnectionAccounting::Charge> charge;
+    auto link = connect(charge);
     if (!link) {
         return nullptr;
     }
@@ -118,13 +119,16 @@ std::shared_ptr<BusLink> LinuxConnection::usableLink()
         }
         link_ = link;
         peer_ = link->peer;
+        if (charge) {
+            charge_ = std::move(charge);
+        }
     }
     connecting.unlock();
     link->start();
     return link;
 }
 
-std::shared_ptr<BusLink> LinuxConnection::connect()
+std::shared_ptr<BusLink> LinuxConnection::connect(std::unique_ptr<ConnectionAccounting::Charge>& charge)
 {
     Connector connector;
     {
@@ -136,6 +140,7 @@ std::shared_ptr<BusLink> LinuxConnection::connect()
         TYLog_Debug(context_->log, "cannot connect: " + connected.problem);
         return nullptr;
     }
+    charge = std::move(connected.charge);
     return std::make_shared<BusLink>(context_, std::move(connected.socket), connected.role, connected.peer,
                                      weak_from_this());
 }

@@ -20,6 +20,8 @@ struct ConnectedSocket {
     AuditToken peer;
     BusLink::Role role = BusLink::Role::client;
     std::string problem;
+    /// Given back when the connection ends; null where the peer is not charged for it.
+    std::unique_ptr<ConnectionAccounting::Charge> charge = nullptr;
 };
 
 /// A connection over Unix sockets: dispatches what its link reads to the exported object, in order, as items
@@ -63,7 +65,7 @@ private:
     using Item = std::function<Task<void>(Self)>;
 
     std::shared_ptr<BusLink> usableLink();
-    std::shared_ptr<BusLink> connect();
+    std::shared_ptr<BusLink> connect(std::unique_ptr<ConnectionAccounting::Charge>& charge);
     void startCall(std::string_view interface, std::string_view member, Arguments arguments, bool expectReply,
                    std::int64_t timeout, BusLink::Completion completion);
     void answerOther(BusLink& link, sd_bus_message* call, const CallTarget& target,

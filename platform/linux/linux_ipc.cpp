@@ -48,7 +48,14 @@ ConnectedSocket connectToEndpoint(const IpcContext& context,
     if (!objection.empty()) {
         return {{}, {}, role, std::move(objection)};
     }
-    return {std::move(connected.socket), peer, role, {}};
+    auto admission = context.accounting->admit(peer);
+    if (!admission.refusal.empty()) {
+        TYLog_Error(context.log, admission.refusal);
+    }
+    if (!admission.charge) {
+        return {{}, {}, role, "its process has too many connections"};
+    }
+    return {std::move(connected.socket), peer, role, {}, std::move(admission.charge)};
 }
 
 ConnectedSocket connectToService(const IpcContext& context, const std::string& name)
