@@ -106,8 +106,22 @@ private:
             client->checkInQuietly();
         }
         world_.simulated.drain();
+        spreadTheWord();
         for (const auto& client : clients_) {
             client->judgeOutcomes();
+        }
+    }
+
+    /// Everything there is is reported as new, by the daemon's own hand; every client hears its share.
+    void spreadTheWord()
+    {
+        for (const auto& client : clients_) {
+            client->listenClosely();
+        }
+        const auto report = reportOfAdded(world_.registry.enabled());
+        world_.simulated.run(world_.daemon->fontChanged(report, [] {}));
+        for (const auto& client : clients_) {
+            client->judgeHearing();
         }
     }
 
@@ -118,6 +132,7 @@ private:
         }
         world_.simulated.drain();
         expectNone("connections", world_.simulated.ipc.connectionCount());
+        expectNone("failed reply handlers", world_.simulated.log.countContaining("reply handler failed"));
         expectNone("observers", world_.daemon->notificationCenter().observerCount("fontChanged"));
         expectNone("failed handlers", world_.simulated.log.countContaining("handler of "));
         expectNone("replies that do not fit", world_.simulated.log.countContaining("does not fit"));

@@ -73,6 +73,9 @@ void SimulatedClient::connect()
 {
     connection_ = world_.simulated.ipc.connectClient(wire::serviceName, token_);
     connection_->setRemoteObjectInterfaces(isHostile_ ? hostileInterfaces() : wire::typhonDaemonInterfaces());
+    connection_->setExportedInterfaces(wire::typhonClientInterfaces());
+    connection_->setExportedObject(
+        std::make_shared<ChangeListener>([this](const HeardChange& change) { hear(change); }));
     connection_->resume();
 }
 
@@ -111,13 +114,13 @@ void SimulatedClient::callSomething()
         call(wire::requestFonts, list, nullptr, ipc_errors::notSupported);
         break;
     case 4:
-        call(wire::fontChanged, {PropertyList()}, nullptr, ipc_errors::notSupported);
+        call(wire::fontChanged, {someReport(world_)});
         break;
     case 5:
         call(wire::scheduleFontFilesDeletion, list, nullptr, ipc_errors::notSupported);
         break;
     case 6:
-        call(wire::checkinForSilkpageProcess, {endpoint}, nullptr, ipc_errors::notSupported);
+        checkInContent();
         break;
     case 7:
         call(wire::requestFontsForClient, {PropertyList("Alpha"), endpoint}, nullptr,
@@ -275,6 +278,10 @@ void SimulatedClient::judgeOutcomes()
 
 void SimulatedClient::disconnect()
 {
+    for (const auto& content : contents_) {
+        content->vanish();
+    }
+    contents_.clear();
     if (connection_) {
         connection_->invalidate();
         connection_.reset();
@@ -292,6 +299,10 @@ void SimulatedClient::vanish()
 {
     world_.simulated.processes.exit(token_);
     world_.simulated.ipc.endProcess(token_);
+    for (const auto& content : contents_) {
+        content->vanish();
+    }
+    contents_.clear();
     connection_.reset();
     isGone_ = true;
 }

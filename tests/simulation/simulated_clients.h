@@ -2,6 +2,8 @@
 
 #include "protocol/wire.h"
 #include "simulation/allowance.h"
+#include "simulation/simulated_changes.h"
+#include "simulation/simulated_content.h"
 #include "simulation/world.h"
 
 #include <memory>
@@ -38,6 +40,11 @@ public:
     void checkInQuietly();
     /// Reports calls without their one outcome. Nothing else may be going on.
     void judgeOutcomes();
+    /// From here on what the client hears of changes is kept for `judgeHearing`.
+    void listenClosely() { heard_.clear(); }
+    /// Expects to have heard exactly its share of the report that the device's enabled fonts came, once. It
+    /// checked in before; nothing else may be going on.
+    void judgeHearing();
     void disconnect();
 
 private:
@@ -51,6 +58,9 @@ private:
 
     void connect();
     void callSomething();
+    void hear(const HeardChange& change);
+    void checkInContent();
+    void judgeContent(const SimulatedContent& content, const std::optional<PropertyList>& info);
     std::shared_ptr<Call> call(const wire::Operation& operation, Arguments arguments = {},
                                Judge judge = nullptr,
                                std::optional<std::string> expectedError = std::nullopt);
@@ -78,6 +88,8 @@ private:
     bool isHostile_ = false;
     std::shared_ptr<Connection> connection_;
     std::vector<std::shared_ptr<Call>> calls_;
+    std::vector<HeardChange> heard_;
+    std::vector<std::shared_ptr<SimulatedContent>> contents_;
 };
 
 }  // namespace typhon::simulation
