@@ -145,7 +145,7 @@ constexpr std::array table{
     DispatchedOperation{wire::requestFontsForClient, fontPicker, toCome, requestFontsForClient},
     DispatchedOperation{wire::fontChanged, everyone, served, fontChanged},
     DispatchedOperation{wire::updatingUserFonts, everyone, served, updatingUserFonts},
-    DispatchedOperation{wire::scheduleFontFilesDeletion, everyone, toCome, scheduleFontFilesDeletion},
+    DispatchedOperation{wire::scheduleFontFilesDeletion, everyone, served, scheduleFontFilesDeletion},
     DispatchedOperation{wire::synchronizeFontAssets, everyone, toCome, synchronizeFontAssets},
     DispatchedOperation{wire::resetIssuedFontsFor, everyone, served, resetIssuedFontsFor},
     DispatchedOperation{wire::checkinForSilkpageProcess, everyone, served, checkinForSilkpageProcess},

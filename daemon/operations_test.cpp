@@ -82,7 +82,7 @@ TEST_F(OperationsTest, TheOperationsToComeAreThese)
         }
     }
     EXPECT_EQ(toCome, (std::set<std::string>{"requestFonts_reply", "requestFonts_forClient_reply",
-                                             "scheduleFontFilesDeletion", "synchronizeFontAssets_reply"}));
+                                             "synchronizeFontAssets_reply"}));
 }
 
 TEST_F(OperationsTest, OperationsToComeAnswerNotSupported)
@@ -90,7 +90,6 @@ TEST_F(OperationsTest, OperationsToComeAnswerNotSupported)
     const Arguments list{PropertyList(PropertyList::Array{})};
     const Outcomes notSupported{ipc_errors::notSupported};
     EXPECT_EQ(outcomesOf(wire::requestFonts, list), notSupported);
-    EXPECT_EQ(outcomesOf(wire::scheduleFontFilesDeletion, list), notSupported);
     EXPECT_EQ(outcomesOf(wire::synchronizeFontAssets, list), notSupported);
 }
 
@@ -117,6 +116,7 @@ TEST_F(OperationsTest, ServedOperationsAnswerOnce)
     EXPECT_EQ(outcomesOf(wire::checkinForFontPicker), one);
     EXPECT_EQ(outcomesOf(wire::fontChanged, {PropertyList()}), one);
     EXPECT_EQ(outcomesOf(wire::updatingUserFonts), one);
+    EXPECT_EQ(outcomesOf(wire::scheduleFontFilesDeletion, {PropertyList(PropertyList::Array{})}), one);
     EXPECT_EQ(outcomesOf(wire::resetIssuedFontsFor, {PropertyList("com.example.app")}), one);
 }
 
@@ -142,7 +142,6 @@ TEST_F(OperationsTest, TheDaemonItselfDoesNotKnowWhatItDoesNotImplement)
     EXPECT_TRUE(isUnknown(daemon->sendFonts({}, [] {})));
     EXPECT_TRUE(isUnknown(daemon->requestFonts({}, [](const PropertyList&) {})));
     EXPECT_TRUE(isUnknown(daemon->requestFonts("", nullptr, [](bool) {})));
-    EXPECT_TRUE(isUnknown(daemon->scheduleFontFilesDeletion({})));
     EXPECT_TRUE(
         isUnknown(daemon->synchronizeFontAssets({}, [](bool, const std::optional<PropertyList>&) {})));
     EXPECT_TRUE(isUnknown(daemon->checkinForSilkpageProcess(nullptr, [] {})));

@@ -38,7 +38,8 @@ TyphonDaemon::TyphonDaemon(Platform& platform)
                return issuedPathsLedger_.issuedFontFilePathsForIdentifier(identifier);
            }}),
       fontChangeBroadcast_(platform, userFontRegistry_, perClientFontInfo_, notificationCenter_,
-                           *mainHandlerQueue_)
+                           *mainHandlerQueue_),
+      scheduledFontDeletion_(std::make_shared<ScheduledFontDeletion>(platform, [] {}))
 {}
 
 void TyphonDaemon::setupForSluiceService()
@@ -52,7 +53,7 @@ void TyphonDaemon::setupForSluiceService()
 
 void TyphonDaemon::setupForScheduledFontDeletion()
 {
-    scheduledFontDeletion_.setupForScheduledFontDeletion();
+    scheduledFontDeletion_->setupForScheduledFontDeletion();
 }
 
 void TyphonDaemon::setupForDistributedNotifications()
@@ -150,9 +151,9 @@ Task<void> TyphonDaemon::requestFonts(std::string /*postScriptName*/,
     return doesNotRecognizeSelector("requestFonts:forClient:reply:");
 }
 
-Task<void> TyphonDaemon::scheduleFontFilesDeletion(std::vector<std::string> /*paths*/)
+Task<void> TyphonDaemon::scheduleFontFilesDeletion(std::vector<std::string> paths)
 {
-    return doesNotRecognizeSelector("scheduleFontFilesDeletion:");
+    return scheduledFontDeletion_->scheduleFontFilesDeletion(std::move(paths));
 }
 
 Task<void> TyphonDaemon::synchronizeFontAssets(std::vector<std::string> /*paths*/, OutcomeReply /*reply*/)

@@ -90,8 +90,8 @@ private:
     IssuedPathsLedger issuedPathsLedger_;
     PerClientFontInfo perClientFontInfo_;
     FontChangeBroadcast fontChangeBroadcast_;
-    ScheduledFontDeletion scheduledFontDeletion_;
     ApplicationRemoval applicationRemoval_;
+    const std::shared_ptr<ScheduledFontDeletion> scheduledFontDeletion_;
     AssetCatalogueEvents assetCatalogueEvents_;
     AssetDirectoryMonitoring assetDirectoryMonitoring_;
     ObsoleteAssetPurge obsoleteAssetPurge_;

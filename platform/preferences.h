@@ -29,6 +29,14 @@ public:
         const auto* number = found ? found->asInteger() : nullptr;
         return number == nullptr ? 0 : *number;
     }
+    /// A number, whole or not; missing or of another kind reads as 0.
+    double number(const std::string& key)
+    {
+        const auto found = value(key);
+        const auto* real = found ? found->asReal() : nullptr;
+        const auto* whole = found ? found->asInteger() : nullptr;
+        return real != nullptr ? *real : whole != nullptr ? static_cast<double>(*whole) : 0;
+    }
     /// A dictionary preference; missing or of another kind reads as empty.
     PropertyList::Dictionary dictionary(const std::string& key)
     {

@@ -1,5 +1,6 @@
 #include "platform/linux/linux_file_system.h"
 
+#include "platform/linux/linux_confined_deletion.h"
 #include "platform/linux/property_list_reader.h"
 #include "platform/linux/regular_file.h"
 
@@ -79,6 +80,11 @@ std::optional<std::vector<std::string>> LinuxFileSystem::contentsOfDirectory(con
     }
     std::ranges::sort(names);
     return names;
+}
+
+std::unique_ptr<ConfinedDeletion> LinuxFileSystem::deletionBelow(const std::string& tree)
+{
+    return std::make_unique<LinuxConfinedDeletion>(root_, tree);
 }
 
 }  // namespace typhon

@@ -3,6 +3,7 @@
 #include "platform/file_system.h"
 #include "platform/linux/root_directory.h"
 
+#include <memory>
 #include <optional>
 #include <string>
 #include <utility>
@@ -18,6 +19,7 @@ public:
     bool exists(const std::string& path) override;
     PropertyListReading readPropertyList(const std::string& path) override;
     std::optional<std::vector<std::string>> contentsOfDirectory(const std::string& path) override;
+    std::unique_ptr<ConfinedDeletion> deletionBelow(const std::string& tree) override;
 
 private:
     std::optional<std::string> realPath(const std::string& path) const;

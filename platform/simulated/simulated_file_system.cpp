@@ -1,5 +1,8 @@
 #include "platform/simulated/simulated_file_system.h"
 
+#include "platform/path_below.h"
+
+#include <algorithm>
 #include <utility>
 
 namespace typhon {
@@ -24,6 +27,55 @@ std::string prefixOfContents(const std::string& directory)
 {
     return directory == "/" ? directory : directory + "/";
 }
+
+constexpr std::size_t longestFileName = 255;
+
+class SimulatedDeletion final : public ConfinedDeletion {
+public:
+    SimulatedDeletion(SimulatedFileSystem& files, std::string tree) : files_(files), tree_(std::move(tree)) {}
+
+    std::optional<std::string> removeItem(const std::string& path) override
+    {
+        const auto names = namesBelow(tree_, path);
+        if (!names || names->empty()) {
+            return "not a path below " + tree_;
+        }
+        if (std::ranges::any_of(*names, [](const auto& name) { return name.size() > longestFileName; })) {
+            return "File name too long";
+        }
+        const auto plain = plainPath(*names);
+        if (!files_.exists(plain)) {
+            return "No such file or directory";
+        }
+        if (files_.isUndeletable(plain)) {
+            return "Operation not permitted";
+        }
+        files_.remove(plain);
+        return std::nullopt;
+    }
+    void removeEmptyDirectory(const std::string& path) override
+    {
+        const auto names = namesBelow(tree_, path + "/");
+        const auto plain = names ? plainPath(*names) : std::string();
+        const auto contents = names ? files_.contentsOfDirectory(plain) : std::nullopt;
+        if (contents && contents->empty()) {
+            files_.remove(plain);
+        }
+    }
+
+private:
+    std::string plainPath(const std::vector<std::string>& names) const
+    {
+        std::string path = withoutFinalSlash(tree_);
+        for (const auto& name : names) {
+            path += "/" + name;
+        }
+        return path;
+    }
+
+    SimulatedFileSystem& files_;
+    const std::string tree_;
+};
 
 }  // namespace
 
@@ -67,6 +119,11 @@ std::optional<std::vector<std::string>> SimulatedFileSystem::contentsOfDirectory
         }
     }
     return names;
+}
+
+std::unique_ptr<ConfinedDeletion> SimulatedFileSystem::deletionBelow(const std::string& tree)
+{
+    return std::make_unique<SimulatedDeletion>(*this, tree);
 }
 
 void SimulatedFileSystem::addFile(const std::string& path, PropertyList value)

@@ -5,7 +5,9 @@
 #include <cstddef>
 #include <functional>
 #include <map>
+#include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -20,6 +22,7 @@ public:
     bool exists(const std::string& path) override;
     PropertyListReading readPropertyList(const std::string& path) override;
     std::optional<std::vector<std::string>> contentsOfDirectory(const std::string& path) override;
+    std::unique_ptr<ConfinedDeletion> deletionBelow(const std::string& tree) override;
 
     /// Adds or replaces a file, with the directories above it.
     void addFile(const std::string& path, PropertyList value);
@@ -32,6 +35,9 @@ public:
     /// Called in the midst of every reading: the reading's result is already decided, the reader does not
     /// have it yet. May change the tree.
     void setDuringRead(std::function<void(const std::string& path)> hook) { duringRead_ = std::move(hook); }
+    /// Has deletions of that very path fail.
+    void setUndeletable(const std::string& path) { undeletable_.insert(path); }
+    bool isUndeletable(const std::string& path) const { return undeletable_.contains(path); }
     /// How often a reading of that path, or of any path, was tried.
     std::size_t reads(const std::string& path) const;
     std::size_t reads() const { return readsInAll_; }
@@ -46,6 +52,7 @@ private:
 
     std::map<std::string, Node> nodes_;
     std::map<std::string, std::size_t> reads_;
+    std::set<std::string> undeletable_;
     std::size_t readsInAll_ = 0;
     std::function<void(const std::string&)> duringRead_;
 };

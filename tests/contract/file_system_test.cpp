@@ -132,6 +132,99 @@ TEST_P(FileSystemContract, WhatIsNoDirectoryCannotBeListed)
     EXPECT_EQ(files().contentsOfDirectory("/absent"), std::nullopt);
 }
 
+constexpr const char* tree = "/var/fonts/";
+
+TEST_P(FileSystemContract, AnItemBelowTheTreeIsDeletedAlone)
+{
+    subject->addFile("/var/fonts/x/a", PropertyList());
+    subject->addFile("/var/fonts/x/ab", PropertyList());
+    const auto deletion = files().deletionBelow(tree);
+    EXPECT_EQ(deletion->removeItem("/var/fonts/x/a"), std::nullopt);
+    EXPECT_FALSE(files().exists("/var/fonts/x/a"));
+    EXPECT_TRUE(files().exists("/var/fonts/x/ab"));
+    EXPECT_NE(deletion->removeItem("/var/fonts/x/a"), std::nullopt) << "it is gone already";
+}
+
+TEST_P(FileSystemContract, ADirectoryIsDeletedWithItsContents)
+{
+    subject->addFile("/var/fonts/x/deep/er/a", PropertyList());
+    subject->addFile("/var/fonts/x/deep/b", PropertyList());
+    subject->addDirectory("/var/fonts/x/deep/empty");
+    subject->addFile("/var/fonts/x/deeper", PropertyList());
+    const auto deletion = files().deletionBelow(tree);
+    EXPECT_EQ(deletion->removeItem("/var/fonts/x/deep"), std::nullopt);
+    EXPECT_EQ(files().contentsOfDirectory("/var/fonts/x"), std::vector<std::string>{"deeper"});
+}
+
+TEST_P(FileSystemContract, BlankNamesDotsAndFinalSlashesInAPathMeanNothing)
+{
+    subject->addFile("/var/fonts/x/a", PropertyList());
+    subject->addFile("/var/fonts/x/b", PropertyList());
+    const auto deletion = files().deletionBelow(tree);
+    EXPECT_EQ(deletion->removeItem("/var/fonts//x/./a"), std::nullopt);
+    EXPECT_EQ(deletion->removeItem("/var/fonts/x/b//"), std::nullopt);
+    EXPECT_EQ(files().contentsOfDirectory("/var/fonts/x"), std::vector<std::string>());
+}
+
+TEST_P(FileSystemContract, NothingOutsideTheTreeIsEverDeleted)
+{
+    const std::vector<std::string> sentinels{"/var/sentinel", "/var/fonts/x/a", "/var/fonts2/a"};
+    for (const auto& sentinel : sentinels) {
+        subject->addFile(sentinel, PropertyList());
+    }
+    const auto deletion = files().deletionBelow(tree);
+    for (const auto& path : std::vector<std::string>{
+             "/var/sentinel", "/var/fonts2/a", "/var/fonts/../sentinel", "/var/fonts/x/../../sentinel",
+             "/var/fonts/x/../x/a", "/var/fonts/..", "/var/fonts", "/var/fonts/", "/var/fonts//",
+             "/var/fonts/.", "", "/", "var/fonts/x/a", "x/a", std::string("/var/fonts/x/a\0", 15),
+             std::string("/var/fonts/x/a\0/b", 17), "/var/fonts/x/a/b",
+             "/var/fonts/" + std::string(100'000, 'n'), "/var/fonts/absent/a"}) {
+        EXPECT_NE(deletion->removeItem(path), std::nullopt) << path.substr(0, 100);
+        deletion->removeEmptyDirectory(path);
+    }
+    for (const auto& sentinel : sentinels) {
+        EXPECT_TRUE(files().exists(sentinel)) << sentinel;
+    }
+}
+
+TEST_P(FileSystemContract, OnlyAnEmptyDirectoryIsDeletedAsOne)
+{
+    subject->addDirectory("/var/fonts/empty/emptier");
+    subject->addFile("/var/fonts/x/a", PropertyList());
+    subject->addDirectory("/var/elsewhere");
+    const auto deletion = files().deletionBelow(tree);
+    for (const char* path : {"/var/fonts/x", "/var/fonts/x/a", "/var/fonts/empty", "/var/fonts",
+                             "/var/elsewhere", "/var/fonts/x/../../elsewhere", "/var/fonts/absent", ""}) {
+        deletion->removeEmptyDirectory(path);
+    }
+    EXPECT_TRUE(files().exists("/var/fonts/x/a"));
+    EXPECT_TRUE(files().exists("/var/fonts/empty/emptier"));
+    EXPECT_TRUE(files().exists("/var/elsewhere"));
+    deletion->removeEmptyDirectory("/var/fonts/empty/emptier");
+    EXPECT_FALSE(files().exists("/var/fonts/empty/emptier"));
+    deletion->removeEmptyDirectory("/var/fonts/empty");
+    EXPECT_FALSE(files().exists("/var/fonts/empty"));
+}
+
+TEST_P(FileSystemContract, TheTreeItselfGoesAsAnEmptyDirectoryAndNothingAboveIt)
+{
+    subject->addDirectory("/var/fonts");
+    const auto deletion = files().deletionBelow(tree);
+    deletion->removeEmptyDirectory("/var/fonts");
+    EXPECT_FALSE(files().exists("/var/fonts"));
+    deletion->removeEmptyDirectory("/var");
+    EXPECT_TRUE(files().exists("/var"));
+    EXPECT_NE(deletion->removeItem("/var/fonts/a"), std::nullopt);
+}
+
+TEST_P(FileSystemContract, ATreeThatIsNotThereFailsEveryDeletion)
+{
+    const auto deletion = files().deletionBelow(tree);
+    EXPECT_NE(deletion->removeItem("/var/fonts/x/a"), std::nullopt);
+    deletion->removeEmptyDirectory("/var/fonts/x");
+    deletion->removeEmptyDirectory("/var/fonts");
+}
+
 INSTANTIATE_TEST_SUITE_P(, FileSystemContract,
                          testing::Values(Implementation{"Simulated", std::make_unique<SimulatedSubject>},
                                          Implementation{"Linux", std::make_unique<LinuxSubject>}),

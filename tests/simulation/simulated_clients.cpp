@@ -117,7 +117,7 @@ void SimulatedClient::callSomething()
         call(wire::fontChanged, {someReport(world_)});
         break;
     case 5:
-        call(wire::scheduleFontFilesDeletion, list, nullptr, ipc_errors::notSupported);
+        call(wire::scheduleFontFilesDeletion, {arrayOfStrings({world_.registry.somePath(), "/etc/passwd"})});
         break;
     case 6:
         checkInContent();
