@@ -6,6 +6,7 @@
 #include "platform/linux/event_pool.h"
 #include "platform/linux/extension_tokens.h"
 #include "platform/linux/file_access_broker.h"
+#include "platform/linux/identities_service.h"
 #include "platform/linux/linux_analytics.h"
 #include "platform/linux/linux_application_registry.h"
 #include "platform/linux/linux_clock.h"
@@ -32,7 +33,7 @@
 #include <CLI/CLI.hpp>
 
 // The composition root: the one place that knows the services of Linux. It builds them, hands them to the
-// daemon as a `Platform`, opens the two services beside the daemon's own, and gives the main thread away.
+// daemon as a `Platform`, opens the services beside the daemon's own, and gives the main thread away.
 // Nothing here is ever torn down: the process runs until the system stops it.
 
 namespace typhon {
@@ -59,7 +60,7 @@ struct LinuxServices {
     LinuxPreferences preferences{root, log};
     LinuxFileSystem fileSystem{root};
     LinuxApplicationRegistry applicationRegistry{root, log};
-    LinuxUserFontManager userFontManager;
+    LinuxUserFontManager userFontManager{root, log};
     LinuxProcessLifecycle processLifecycle;
     LinuxRemoteAlerts remoteAlerts{log};
     LinuxAnalytics analytics;
@@ -123,8 +124,11 @@ void run(const Options& options)
     const auto broker = std::make_shared<FileAccessBroker>(services.codeSigning, services.tokens,
                                                            services.root, services.log);
     const auto sandboxes = std::make_shared<SandboxesService>(services.sandboxInstances, services.log);
+    const auto identities =
+        std::make_shared<IdentitiesService>(services.codeSigning, services.sandbox, services.log);
     const auto brokerListener = startFileAccessService(services.ipc, broker);
     const auto sandboxesListener = startSandboxesService(services.ipc, sandboxes);
+    const auto identitiesListener = startIdentitiesService(services.ipc, identities);
 
     services.notifications.start();
 

@@ -2,6 +2,7 @@
 
 #include "fontmanager/directory_names.h"
 #include "fontmanager/font_names.h"
+#include "fontmanager/font_paths.h"
 #include "fontmanager/registry_writer.h"
 #include "platform/linux/durable_file.h"
 #include "platform/linux/regular_file.h"
@@ -28,7 +29,6 @@ namespace typhon {
 
 namespace {
 
-constexpr const char* fontFilesDirectory = "/var/mobile/Library/UserFonts/FontFiles/";
 constexpr const char* temporaryPrefix = ".installing-";
 constexpr mode_t directoryPermissions = 0755;
 constexpr mode_t filePermissions = 0644;
@@ -192,7 +192,7 @@ std::optional<std::string> install(Installation& installation, const std::vector
 std::optional<std::string> fontDirectoryOfProvider(const std::string& identifier)
 {
     const auto name = directoryNameFromIdentifier(identifier);
-    return name ? std::optional(fontFilesDirectory + *name) : std::nullopt;
+    return name ? std::optional(font_paths::fontFiles + *name) : std::nullopt;
 }
 
 FontInstallation installFontFiles(const RootDirectory& root, const std::string& identifier,

@@ -1,10 +1,40 @@
 #include "fontmanager/linux_user_font_manager.h"
 
 #include "fontmanager/directory_names.h"
+#include "fontmanager/font_paths.h"
+#include "fontmanager/font_registry_client.h"
+#include "fontmanager/profile_fonts.h"
 
+#include <set>
 #include <utility>
 
 namespace typhon {
+
+namespace {
+
+template <class T>
+FontManagerError errorOf(const ClientResult<T>& result)
+{
+    return result ? std::nullopt : FontManagerError(result.error().message);
+}
+
+}  // namespace
+
+LinuxUserFontManager::LinuxUserFontManager(RootDirectory root, Log& log, std::optional<std::string> helper)
+    : root_(std::move(root)), log_(log), helper_(std::move(helper))
+{}
+
+LinuxUserFontManager::~LinuxUserFontManager()
+{
+    {
+        const std::lock_guard lock(mutex_);
+        isEnding_ = true;
+    }
+    changed_.notify_all();
+    if (worker_.joinable()) {
+        worker_.join();
+    }
+}
 
 std::optional<std::string> LinuxUserFontManager::directoryNameFromIdentifier(const std::string& identifier)
 {
@@ -18,57 +48,114 @@ std::optional<std::string> LinuxUserFontManager::identifierFromDirectoryName(con
 
 PropertyList LinuxUserFontManager::userFontsInfo()
 {
-    return PropertyList::Dictionary{};
+    return readFontRecord(root_, font_paths::registry);
 }
 
 PropertyList LinuxUserFontManager::profileFontsInfo()
 {
-    return PropertyList::Dictionary{};
+    return readFontRecord(root_, font_paths::profileFonts);
 }
 
 std::vector<std::string> LinuxUserFontManager::knownFontProviders()
 {
-    return {};
+    std::set<std::string> providers;
+    const auto entries = userFontsInfo();
+    for (const auto& [path, entry] : *entries.asDictionary()) {
+        const auto place = font_paths::placeOfFontFile(path);
+        const auto identifier = place ? typhon::identifierFromDirectoryName(place->directory) : std::nullopt;
+        if (identifier) {
+            providers.insert(*identifier);
+        }
+    }
+    return {providers.begin(), providers.end()};
 }
 
-void LinuxUserFontManager::enableOrDisablePersistentURLs(std::vector<std::string> /*urls*/, bool /*enabled*/,
+void LinuxUserFontManager::enableOrDisablePersistentURLs(std::vector<std::string> urls, bool enabled,
                                                          std::function<void(FontManagerError)> completion)
 {
-    completeLater([completion = std::move(completion)] {
-        if (completion) {
-            completion("the helper of the font registry is not there");
-        }
-    });
+    start([urls = std::move(urls),
+           enabled](FontRegistryClient& client) { return errorOf(client.enableOrDisable(urls, enabled)); },
+          std::move(completion));
 }
 
 void LinuxUserFontManager::unregisterAndRemoveFontFilesForIdentifier(
-    std::string /*identifier*/, std::function<void(FontManagerError)> completionHandler)
+    std::string identifier, std::function<void(FontManagerError)> completionHandler)
 {
-    completeLater([completion = std::move(completionHandler)] {
-        if (completion) {
-            completion("the helper of the font registry is not there");
-        }
-    });
+    if (!typhon::directoryNameFromIdentifier(identifier)) {
+        // Nobody has fonts under such an identifier.
+        start({}, std::move(completionHandler));
+        return;
+    }
+    start([identifier = std::move(identifier)](
+              FontRegistryClient& client) { return errorOf(client.unregisterAllFonts(identifier)); },
+          std::move(completionHandler));
+}
+
+void LinuxUserFontManager::synchronizeFontProviders()
+{
+    start([](FontRegistryClient& client) { return errorOf(client.synchronizeFontProviders()); },
+          [this](const FontManagerError& error) {
+              if (error) {
+                  TYLog_Error(log_, "font providers were not synchronised: " + *error);
+              }
+          });
 }
 
 void LinuxUserFontManager::synchronizeProfileFonts(std::function<void()> completion)
 {
-    completeLater(std::move(completion));
+    start([](FontRegistryClient& client) { return errorOf(client.synchronizeProfileFonts()); },
+          [this, completion = std::move(completion)](const FontManagerError& error) {
+              if (error) {
+                  TYLog_Error(log_, "profile fonts were not synchronised: " + *error);
+              }
+              if (completion) {
+                  completion();
+              }
+          });
 }
 
-void LinuxUserFontManager::completeLater(std::function<void()> completion)
+FontManagerError LinuxUserFontManager::perform(const Operation& operation) const
 {
-    const std::lock_guard lock(mutex_);
-    newest_ = std::jthread(
-        [](std::jthread before, std::function<void()> complete) {
-            if (before.joinable()) {
-                before.join();
+    if (!operation) {
+        return std::nullopt;
+    }
+    // An empty root would be the environment's.
+    auto client = FontRegistryClient::connect(
+        {.root = root_.isScratch() ? root_.directory() : std::string("/"), .helper = helper_});
+    return client ? operation(*client) : FontManagerError(client.error().message);
+}
+
+void LinuxUserFontManager::start(Operation operation, std::function<void(FontManagerError)> completion)
+{
+    {
+        const std::lock_guard lock(mutex_);
+        pending_.emplace_back([this, operation = std::move(operation), completion = std::move(completion)] {
+            auto error = perform(operation);
+            if (completion) {
+                completion(std::move(error));
             }
-            if (complete) {
-                complete();
-            }
-        },
-        std::move(newest_), std::move(completion));
+        });
+        if (!worker_.joinable()) {
+            worker_ = std::thread([this] { work(); });
+        }
+    }
+    changed_.notify_one();
+}
+
+void LinuxUserFontManager::work()
+{
+    std::unique_lock lock(mutex_);
+    while (true) {
+        changed_.wait(lock, [this] { return isEnding_ || !pending_.empty(); });
+        if (pending_.empty()) {
+            return;
+        }
+        const auto next = std::move(pending_.front());
+        pending_.pop_front();
+        lock.unlock();
+        next();
+        lock.lock();
+    }
 }
 
 }  // namespace typhon

@@ -1,7 +1,11 @@
 #pragma once
 
+#include "platform/linux/root_directory.h"
+#include "platform/log.h"
 #include "platform/user_font_manager.h"
 
+#include <condition_variable>
+#include <deque>
 #include <functional>
 #include <mutex>
 #include <optional>
@@ -11,10 +15,17 @@
 
 namespace typhon {
 
-/// The font-registry library over the files of this machine. Waits, when destroyed, for the completions
-/// that are under way; so it is not destroyed by one of them.
+class FontRegistryClient;
+
+/// The font-registry library over the files of this machine and, for whatever changes them, its helper, which
+/// it starts where no service manager does. Operations run one after another, and their completions come in
+/// order. Waits, when destroyed, for those that are under way; so it is not destroyed by a completion.
 class LinuxUserFontManager final : public TYUserFontManager {
 public:
+    /// `log` outlives this. `helper` is the helper's executable; null for the one that is found.
+    LinuxUserFontManager(RootDirectory root, Log& log, std::optional<std::string> helper = std::nullopt);
+    ~LinuxUserFontManager() override;
+
     std::optional<std::string> directoryNameFromIdentifier(const std::string& identifier) override;
     std::optional<std::string> identifierFromDirectoryName(const std::string& directoryName) override;
     PropertyList userFontsInfo() override;
@@ -24,17 +35,27 @@ public:
                                        std::function<void(FontManagerError)> completion) override;
     void unregisterAndRemoveFontFilesForIdentifier(
         std::string identifier, std::function<void(FontManagerError)> completionHandler) override;
-    void synchronizeFontProviders() override {}
-    /// No profile fonts can be registered yet, so there is nothing to bring up to date: this only keeps the
-    /// promise that the completion comes later and on another thread. Completions come in order.
+    void synchronizeFontProviders() override;
     void synchronizeProfileFonts(std::function<void()> completion) override;
 
 private:
-    void completeLater(std::function<void()> completion);
+    /// An operation at the helper; null when it succeeded.
+    using Operation = std::function<FontManagerError(FontRegistryClient&)>;
+    void start(Operation operation, std::function<void(FontManagerError)> completion);
+    FontManagerError perform(const Operation& operation) const;
+    void work();
+
+    const RootDirectory root_;
+    Log& log_;
+    const std::optional<std::string> helper_;
 
     std::mutex mutex_;
-    /// Runs the newest completion; owns the thread before it. Under `mutex_`.
-    std::jthread newest_;
+    std::condition_variable changed_;
+    // Below: protected by the mutex.
+    std::deque<std::function<void()>> pending_;
+    bool isEnding_ = false;
+    /// Runs operations and completions. Started with the first; last, so that all it uses is there.
+    std::thread worker_;
 };
 
 }  // namespace typhon

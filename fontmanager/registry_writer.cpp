@@ -1,5 +1,6 @@
 #include "fontmanager/registry_writer.h"
 
+#include "fontmanager/font_paths.h"
 #include "platform/linux/durable_file.h"
 #include "platform/linux/property_list_reader.h"
 #include "platform/linux/property_list_writer.h"
@@ -16,7 +17,6 @@ namespace typhon {
 
 namespace {
 
-constexpr const char* registryPath = "/var/mobile/Library/UserFonts/UserFonts.plist";
 constexpr mode_t directoryPermissions = 0755;
 /// The names of installed fonts are nobody's business but the daemon's.
 constexpr mode_t registryPermissions = 0600;
@@ -81,9 +81,9 @@ std::optional<std::string> putFont(PropertyList::Dictionary& entries, const Regi
 
 RegistryWriter::RegistryWriter(RootDirectory root, Format format) : root_(std::move(root)), format_(format) {}
 
-std::optional<std::string> RegistryWriter::update(const Change& change)
+std::optional<std::string> RegistryWriter::update(const Change& change, const Step& beforeReplacing)
 {
-    const auto path = root_.real(registryPath);
+    const auto path = root_.real(font_paths::registry);
     if (auto error = makeDirectories(directoryOf(path), directoryPermissions)) {
         return error;
     }
@@ -95,10 +95,18 @@ std::optional<std::string> RegistryWriter::update(const Change& change)
     if (registry.error) {
         return registry.error;
     }
+    const auto before = registry.entries;
     if (auto error = change(registry.entries)) {
         return error;
     }
-    return replaceFile(path, encode(std::move(registry.entries), format_), registryPermissions);
+    if (!beforeReplacing && registry.entries == before) {
+        return std::nullopt;
+    }
+    auto error = prepareReplacement(path, encode(std::move(registry.entries), format_), registryPermissions);
+    if (!error && beforeReplacing) {
+        error = beforeReplacing();
+    }
+    return error ? error : finishReplacement(path);
 }
 
 std::optional<std::string> RegistryWriter::add(const std::vector<RegisteredFont>& fonts)

@@ -46,7 +46,11 @@ public:
     /// Any other change, in one step with its reading: `change` edits the entries, and returns null or why
     /// nothing is to be written.
     using Change = std::function<std::optional<std::string>(PropertyList::Dictionary& entries)>;
-    std::optional<std::string> update(const Change& change);
+    /// `beforeReplacing` runs once the changed registry is on the disk, flushed, and only needs to take its
+    /// place; an error of it leaves the old one there. Without it, a change that changes nothing is not
+    /// written.
+    using Step = std::function<std::optional<std::string>()>;
+    std::optional<std::string> update(const Change& change, const Step& beforeReplacing = {});
 
 private:
     const RootDirectory root_;

@@ -51,11 +51,10 @@ TEST_F(RegistryWriterTest, WritesForItsOwnerOnlyInTheFormAskedFor)
     struct stat status {};
     ASSERT_EQ(::stat(scratch.real(registry).c_str(), &status), 0);
     EXPECT_EQ(status.st_mode & 07777, 0600u);
-    const auto before = stored();
     RegistryWriter xml(RootDirectory(scratch.path()), RegistryWriter::Format::xml);
-    ASSERT_EQ(xml.setDisabled({files + "a/x.ttf"}, false), std::nullopt);
+    ASSERT_EQ(xml.setDisabled({files + "a/x.ttf"}, true), std::nullopt);
     EXPECT_TRUE(scratch.readFile(registry).starts_with("<?xml"));
-    EXPECT_EQ(stored(), before);
+    EXPECT_TRUE(stored()->find(files + "a/x.ttf")->find("disabled")->isTrue());
 }
 
 TEST_F(RegistryWriterTest, CarriesOverWhatItDoesNotKnow)
@@ -91,6 +90,32 @@ TEST_F(RegistryWriterTest, AChangeThatFailsChangesNothing)
     EXPECT_TRUE(writer.add(
         {{.path = files + "a/y.ttf", .familyNames = {}}, {.path = "relative", .familyNames = {}}}));
     EXPECT_TRUE(writer.add({{.path = "/not \xFF text", .familyNames = {}}}));
+    EXPECT_EQ(scratch.readFile(registry), before);
+}
+
+TEST_F(RegistryWriterTest, AChangeThatChangesNothingIsNotWritten)
+{
+    ASSERT_EQ(writer.add({{.path = files + "a/x.ttf", .familyNames = {{"X", "X"}}}}), std::nullopt);
+    RegistryWriter xml(RootDirectory(scratch.path()), RegistryWriter::Format::xml);
+    ASSERT_EQ(xml.setDisabled({files + "a/x.ttf"}, false), std::nullopt);
+    EXPECT_TRUE(scratch.readFile(registry).starts_with("bplist00"));
+}
+
+TEST_F(RegistryWriterTest, AStepBeforeReplacingThatFailsLeavesTheOldRegistry)
+{
+    ASSERT_EQ(writer.add({{.path = files + "a/x.ttf", .familyNames = {{"X", "X"}}}}), std::nullopt);
+    const auto before = scratch.readFile(registry);
+    const auto clear = [](PropertyList::Dictionary& entries) {
+        entries.clear();
+        return std::optional<std::string>();
+    };
+    std::string prepared;
+    const auto outcome = writer.update(clear, [&]() -> std::optional<std::string> {
+        prepared = scratch.readFile(std::string(registry) + ".new");
+        return "no";
+    });
+    EXPECT_EQ(outcome, "no");
+    EXPECT_TRUE(prepared.starts_with("bplist00"));
     EXPECT_EQ(scratch.readFile(registry), before);
 }
 

@@ -100,20 +100,33 @@ std::optional<std::string> makeDirectories(const std::string& path, mode_t permi
     return makeDirectory(path, permissions);
 }
 
-std::optional<std::string> replaceFile(const std::string& path, std::span<const std::uint8_t> contents,
-                                       mode_t permissions)
+std::optional<std::string> prepareReplacement(const std::string& path, std::span<const std::uint8_t> contents,
+                                              mode_t permissions)
 {
     const auto temporary = path + ".new";
-    if (auto error = writeNewFile(temporary, contents, permissions)) {
+    auto error = writeNewFile(temporary, contents, permissions);
+    if (error) {
         ::unlink(temporary.c_str());
-        return error;
     }
+    return error;
+}
+
+std::optional<std::string> finishReplacement(const std::string& path)
+{
+    const auto temporary = path + ".new";
     if (::rename(temporary.c_str(), path.c_str()) != 0) {
         auto error = failure("replace", path);
         ::unlink(temporary.c_str());
         return error;
     }
     return flushDirectory(directoryOf(path));
+}
+
+std::optional<std::string> replaceFile(const std::string& path, std::span<const std::uint8_t> contents,
+                                       mode_t permissions)
+{
+    auto error = prepareReplacement(path, contents, permissions);
+    return error ? error : finishReplacement(path);
 }
 
 std::optional<std::string> flushDirectory(const std::string& path)

@@ -40,6 +40,12 @@ std::optional<std::string> makeDirectories(const std::string& path, mode_t permi
 std::optional<std::string> replaceFile(const std::string& path, std::span<const std::uint8_t> contents,
                                        mode_t permissions);
 
+/// The two halves of `replaceFile`, for a caller that has something to do in between: the first needs room on
+/// the disk, the second only a rename.
+std::optional<std::string> prepareReplacement(const std::string& path, std::span<const std::uint8_t> contents,
+                                              mode_t permissions);
+std::optional<std::string> finishReplacement(const std::string& path);
+
 /// Flushes names that were added to, changed in or removed from a directory.
 std::optional<std::string> flushDirectory(const std::string& path);
 

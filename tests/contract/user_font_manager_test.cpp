@@ -1,4 +1,6 @@
 #include "fontmanager/linux_user_font_manager.h"
+#include "platform/linux/linux_log.h"
+#include "platform/linux/scratch_directory.h"
 #include "platform/simulated/simulated_user_font_manager.h"
 
 #include <chrono>
@@ -40,7 +42,10 @@ public:
     void finishSynchronizations() override {}
 
 private:
-    LinuxUserFontManager manager_;
+    ScratchDirectory scratch_;
+    LinuxLog log_{LogLevel::error};
+    /// No program of that name: the helper is not there.
+    LinuxUserFontManager manager_{RootDirectory(scratch_.path()), log_, scratch_.real("/no-helper")};
 };
 
 struct Implementation {

@@ -5,6 +5,7 @@ import json
 import os
 import pathlib
 import plistlib
+import select
 import shutil
 import signal
 import socket
@@ -21,6 +22,8 @@ ASSET_STORE = "/private/var/Cargon/AssetsV2/com_vorlan_Cargon_Font7"
 REGISTRY = "/var/mobile/Library/UserFonts/UserFonts.plist"
 PREFERENCES = "/var/mobile/Library/Preferences/com.vorlan.typhond.plist"
 SERVICE = "com.vorlan.typhond"
+HELPER_SERVICE = "com.vorlan.Typhon.UserFontManager"
+HELPER_PID = "/run/typhon/typhon-fontmanagerd.pid"
 PATIENCE = 60
 
 
@@ -182,7 +185,8 @@ class ScratchSystem:
 
     def start(self, *arguments, **popen_options):
         self.daemon = Daemon(self, arguments, popen_options)
-        for service in (SERVICE, f"{SERVICE}.file-access", f"{SERVICE}.sandboxes"):
+        for service in (SERVICE, f"{SERVICE}.file-access", f"{SERVICE}.sandboxes", f"{SERVICE}.identities",
+                        HELPER_SERVICE):
             self._wait_for_socket(self.socket_path(service))
         return self.daemon
 
@@ -203,6 +207,26 @@ class ScratchSystem:
         if self.daemon is not None:
             self.daemon.kill()
             self.daemon = None
+        self.kill_helper()
+
+    def helper_pid(self):
+        """The process identifier of the font registry's helper, or None when it does not run."""
+        try:
+            pid = int(self.real(HELPER_PID).read_text())
+            os.kill(pid, 0)
+        except (OSError, ValueError):
+            return None
+        return pid
+
+    def kill_helper(self):
+        """Kills the helper, if it runs, and waits until it is gone."""
+        pid = self.helper_pid()
+        if pid is not None:
+            pidfd = os.pidfd_open(pid)
+            signal.pidfd_send_signal(pidfd, signal.SIGKILL)
+            select.select([pidfd], [], [], PATIENCE)
+            os.close(pidfd)
+            self.real(HELPER_PID).unlink(missing_ok=True)
 
     def restart(self, *arguments):
         self.stop()

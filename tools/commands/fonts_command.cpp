@@ -1,5 +1,6 @@
 #include "sdk/client_errors.h"
 #include "tools/commands/command.h"
+#include "tools/commands/font_changes.h"
 #include "tools/font_table.h"
 #include "tools/property_list_file.h"
 #include "tools/property_list_json.h"
@@ -41,6 +42,7 @@ void addFontsCommand(CLI::App& parser, Invocation& invocation)
     command.require_subcommand(1)->fallthrough();
     addCommand<Options>(command, invocation, "list", "List every font of the registry", list,
                         [](CLI::App&, Options&) {});
+    addFontChangeCommands(command, invocation);
 }
 
 }  // namespace typhon

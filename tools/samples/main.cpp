@@ -1,4 +1,5 @@
 #include "faces_in_file.h"
+#include "fontmanager/font_registry_client.h"
 #include "platform/linux/visible_text.h"
 #include "sdk/typhon_client.h"
 
@@ -10,7 +11,8 @@
 #include <fcntl.h>
 
 // A small application of typhon, built once for each identifier, so that each is an executable of its own and
-// can be signed as such. It shows what an application gets to see, and uses nothing but libtyphon.
+// can be signed as such. It shows what an application gets to see, and uses nothing but libtyphon and,
+// for a font provider, the font-registry library.
 
 namespace typhon::sample {
 
@@ -22,6 +24,8 @@ constexpr const char* usage = R"(A sample application of typhon.
   checkin           what it sees, one line a face, and which extensions it got
   read              open every font it sees through its grant and read its names from the descriptor
   try PATH          try to get at a file that was not granted, in every way it has; 0 when all are refused
+  install FILE...   install fonts of its own, as a font provider does
+  remove            remove all fonts of its own
   reset IDENTIFIER  ask the daemon to forget the fonts issued to an application
 
 The system is that of the folder $TYPHON_ROOT, else of this machine.
@@ -194,6 +198,37 @@ int reset(TyphonClient& client, const std::string& application)
     return 0;
 }
 
+int installFonts(const std::vector<std::string>& files)
+{
+    auto registry = FontRegistryClient::connect();
+    if (!registry) {
+        return complain(registry.error());
+    }
+    const auto paths = registry->registerFonts("", files, true);
+    if (!paths) {
+        return complain(paths.error());
+    }
+    std::cout << identifier << " installed " << paths->size() << " font files\n";
+    for (const auto& path : *paths) {
+        std::cout << "  " << visibleText(path) << "\n";
+    }
+    return 0;
+}
+
+int removeFonts()
+{
+    auto registry = FontRegistryClient::connect();
+    if (!registry) {
+        return complain(registry.error());
+    }
+    const auto removed = registry->unregisterAllFonts("");
+    if (!removed) {
+        return complain(removed.error());
+    }
+    std::cout << identifier << " removed " << *removed << " font files\n";
+    return 0;
+}
+
 int runCommand(const std::vector<std::string>& words)
 {
     const auto is = [&](std::string_view command, std::size_t count) {
@@ -202,6 +237,12 @@ int runCommand(const std::vector<std::string>& words)
     if (is("--help", 1) || is("help", 1)) {
         std::cout << usage;
         return 0;
+    }
+    if (words.size() > 1 && words.front() == "install") {
+        return installFonts({words.begin() + 1, words.end()});
+    }
+    if (is("remove", 1)) {
+        return removeFonts();
     }
     if (!is("checkin", 1) && !is("read", 1) && !is("try", 2) && !is("reset", 2)) {
         std::cerr << usage;

@@ -1,0 +1,332 @@
+#include "fontmanager/daemon/font_registry_session.h"
+
+#include "fontmanager/directory_names.h"
+#include "fontmanager/font_paths.h"
+#include "fontmanager/font_registry_wire.h"
+#include "platform/file_url.h"
+#include "platform/linux/bus_message.h"
+#include "platform/linux/visible_text.h"
+
+#include <array>
+#include <string_view>
+#include <utility>
+
+// Who a caller is, is asked anew for every operation that names fonts; the files of a registration come under
+// the permission with which it was begun. Reports go out around the write, so that the daemon neither reads a
+// registry that is just being replaced nor serves one that was.
+
+namespace typhon {
+
+namespace {
+
+using Call = std::shared_ptr<IncomingCall>;
+
+const PropertyList& value(const Call& call, std::size_t index)
+{
+    return std::get<PropertyList>(call->arguments().at(index));
+}
+
+std::string text(const Call& call, std::size_t index)
+{
+    return *value(call, index).asString();
+}
+
+IpcError denied(std::string message)
+{
+    return {ipc_errors::accessDenied, std::move(message)};
+}
+
+struct Paths {
+    std::vector<std::string> paths;
+    std::optional<IpcError> error;
+};
+
+/// The paths of file URLs.
+Paths pathsOf(const PropertyList& urls)
+{
+    Paths result;
+    for (const auto& url : stringsOf(urls)) {
+        auto path = pathFromFileUrl(url);
+        if (!path) {
+            result.error = IpcError{ipc_errors::invalidArguments, visibleText(url, 300) + " is no file URL"};
+            return result;
+        }
+        result.paths.push_back(std::move(*path));
+    }
+    return result;
+}
+
+/// Whose font file that is, or nobody's.
+std::optional<std::string> providerOf(const std::string& path)
+{
+    const auto place = font_paths::placeOfFontFile(path);
+    return place ? identifierFromDirectoryName(place->directory) : std::nullopt;
+}
+
+void answerCount(const Call& call, const FontChange& change)
+{
+    Arguments results;
+    results.emplace_back(
+        PropertyList(static_cast<std::int64_t>(change.available.size() + change.gone.size())));
+    call->reply(std::move(results));
+}
+
+}  // namespace
+
+FontRegistrySession::FontRegistrySession(std::shared_ptr<FontRegistryService> service)
+    : service_(std::move(service))
+{
+    service_->connectionBegan();
+}
+
+FontRegistrySession::~FontRegistrySession()
+{
+    service_->connectionEnded();
+}
+
+Task<void> FontRegistrySession::handle(Self self, AuditToken caller, Call call)
+{
+    using Handler = Task<void> (*)(Self, AuditToken, Call);
+    struct Row {
+        const char* member;
+        Handler handler;
+    };
+    static constexpr std::array table{
+        Row{font_registry_wire::beginRegistration.member, beginRegistration},
+        Row{font_registry_wire::addFontFile.member, addFontFile},
+        Row{font_registry_wire::commitRegistration.member, commitRegistration},
+        Row{font_registry_wire::cancelRegistration.member, cancelRegistration},
+        Row{font_registry_wire::unregister.member, unregister},
+        Row{font_registry_wire::unregisterAll.member, unregisterAll},
+        Row{font_registry_wire::enableOrDisable.member, enableOrDisable},
+        Row{font_registry_wire::synchronizeFontProviders.member, synchronizeFontProviders},
+        Row{font_registry_wire::synchronizeProfileFonts.member, synchronizeProfileFonts},
+    };
+    for (const auto& row : table) {
+        if (call->member() == row.member) {
+            return row.handler(std::move(self), caller, std::move(call));
+        }
+    }
+    abort();
+}
+
+Task<FontRegistrySession::Permission> FontRegistrySession::permissionOf(Self self, AuditToken caller)
+{
+    Task<CallerIdentities::Answer> asking = self->service_->parts().identities.identityOf(caller);
+    const auto answer = co_await std::move(asking);
+    Permission permission;
+    if (!answer.identity) {
+        permission.error = answer.error;
+    } else if (isAdministrator(*answer.identity, self->service_->own())) {
+        permission.everybody = true;
+        permission.identifier = answer.identity->signature.signingIdentifier.value_or("");
+    } else if (isFontProvider(*answer.identity)) {
+        permission.identifier = *answer.identity->signature.signingIdentifier;
+    } else {
+        TYLog_Error(self->service_->parts().log,
+                    "process " + std::to_string(caller.processIdentifier) + " may not change fonts");
+        permission.error = denied("fonts are changed by font providers (signed, with \"system-installation\" "
+                                  "in com.vorlan.developer.user-fonts) and by administrators");
+    }
+    co_return permission;
+}
+
+Task<void> FontRegistrySession::beginRegistration(Self self, AuditToken caller, Call call)
+{
+    if (self->registration_) {
+        call->fail({ipc_errors::failed, "a registration is under way on this connection already"});
+        co_return;
+    }
+    Task<Permission> asking = permissionOf(self, caller);
+    const auto permission = co_await std::move(asking);
+    auto identifier = text(call, 0);
+    identifier = identifier.empty() ? permission.identifier : identifier;
+    if (permission.error || !permission.covers(identifier)) {
+        call->fail(permission.error.value_or(denied("a font provider installs fonts for itself only")));
+        co_return;
+    }
+    auto beginning = self->service_->parts().store.begin(identifier, value(call, 1).isTrue());
+    if (!beginning.registration) {
+        call->fail({ipc_errors::failed, *beginning.error});
+        co_return;
+    }
+    self->registration_ = std::move(beginning.registration);
+    call->reply({});
+}
+
+Task<void> FontRegistrySession::addFontFile(Self self, AuditToken /*caller*/, Call call)
+{
+    const auto* argument = std::get_if<std::shared_ptr<TransferredFile>>(&call->arguments().at(0));
+    const auto* file = dynamic_cast<const LinuxTransferredFile*>(argument->get());
+    if (!self->registration_ || file == nullptr) {
+        call->fail({ipc_errors::failed, "no registration is under way on this connection"});
+        co_return;
+    }
+    if (auto error = self->registration_->add(text(call, 1), file->descriptor.get())) {
+        self->registration_.reset();
+        call->fail({ipc_errors::failed, std::move(*error)});
+        co_return;
+    }
+    Arguments results;
+    results.emplace_back(PropertyList(static_cast<std::int64_t>(self->registration_->fonts().size())));
+    call->reply(std::move(results));
+}
+
+Task<void> FontRegistrySession::commitRegistration(Self self, AuditToken /*caller*/, Call call)
+{
+    const std::shared_ptr<FontRegistration> registration = std::move(self->registration_);
+    if (!registration) {
+        call->fail({ipc_errors::failed, "no registration is under way on this connection"});
+        co_return;
+    }
+    std::vector<std::string> paths;
+    for (const auto& staged : registration->fonts()) {
+        paths.push_back(staged.font.path);
+    }
+    std::function<FontChangeOutcome(FontStore&)> work = [registration](FontStore& store) {
+        return registration->fonts().empty() ? FontChangeOutcome{} : store.commit(*registration);
+    };
+    Task<FontChangeOutcome> changing = change(self, std::move(work));
+    const auto outcome = co_await std::move(changing);
+    if (outcome.error) {
+        call->fail({ipc_errors::failed, *outcome.error});
+        co_return;
+    }
+    Arguments results;
+    results.emplace_back(arrayOfStrings(paths));
+    call->reply(std::move(results));
+}
+
+Task<void> FontRegistrySession::cancelRegistration(Self self, AuditToken /*caller*/, Call call)
+{
+    self->registration_.reset();
+    call->reply({});
+    co_return;
+}
+
+Task<void> FontRegistrySession::unregister(Self self, AuditToken caller, Call call)
+{
+    Task<Permission> asking = permissionOf(self, caller);
+    const auto permission = co_await std::move(asking);
+    auto [paths, error] = pathsOf(value(call, 0));
+    for (const auto& path : paths) {
+        if (!permission.covers(providerOf(path).value_or("")) && !error) {
+            error = denied(visibleText(path, 300) + " is not a font file of the caller's");
+        }
+    }
+    if (permission.error || error) {
+        call->fail(permission.error ? *permission.error : *error);
+        co_return;
+    }
+    std::function<FontChangeOutcome(FontStore&)> work = [paths = std::move(paths)](FontStore& store) {
+        return store.unregister(paths);
+    };
+    Task<void> changing = changeAndAnswer(self, call, std::move(work));
+    co_await std::move(changing);
+}
+
+Task<void> FontRegistrySession::unregisterAll(Self self, AuditToken caller, Call call)
+{
+    Task<Permission> asking = permissionOf(self, caller);
+    const auto permission = co_await std::move(asking);
+    auto identifier = text(call, 0);
+    identifier = identifier.empty() ? permission.identifier : identifier;
+    if (permission.error || !permission.covers(identifier)) {
+        call->fail(permission.error.value_or(denied("a font provider removes its own fonts only")));
+        co_return;
+    }
+    std::function<FontChangeOutcome(FontStore&)> work = [identifier](FontStore& store) {
+        return store.unregisterAll(identifier);
+    };
+    Task<void> changing = changeAndAnswer(self, call, std::move(work));
+    co_await std::move(changing);
+}
+
+Task<void> FontRegistrySession::enableOrDisable(Self self, AuditToken caller, Call call)
+{
+    Task<Permission> asking = permissionOf(self, caller);
+    const auto permission = co_await std::move(asking);
+    auto [paths, error] = pathsOf(value(call, 0));
+    for (const auto& path : paths) {
+        if (!permission.covers(providerOf(path).value_or("")) && !error) {
+            error = denied(visibleText(path, 300) + " is not a font file of the caller's");
+        }
+    }
+    if (permission.error || error) {
+        call->fail(permission.error ? *permission.error : *error);
+        co_return;
+    }
+    const bool enabled = value(call, 1).isTrue();
+    std::function<FontChangeOutcome(FontStore&)> work =
+        [paths = std::move(paths), enabled](FontStore& store) { return store.setEnabled(paths, enabled); };
+    Task<void> changing = changeAndAnswer(self, call, std::move(work));
+    co_await std::move(changing);
+}
+
+Task<void> FontRegistrySession::synchronizeFontProviders(Self self, AuditToken caller, Call call)
+{
+    Task<Permission> asking = permissionOf(self, caller);
+    const auto permission = co_await std::move(asking);
+    if (permission.error || !permission.everybody) {
+        call->fail(permission.error.value_or(denied("that is for the daemon and administrators")));
+        co_return;
+    }
+    std::function<FontChangeOutcome(FontStore&)> work = [](FontStore& store) {
+        return store.synchronizeProviders();
+    };
+    Task<FontChangeOutcome> changing = change(self, std::move(work));
+    const auto outcome = co_await std::move(changing);
+    if (outcome.error) {
+        call->fail({ipc_errors::failed, *outcome.error});
+    } else {
+        call->reply({});
+    }
+}
+
+Task<void> FontRegistrySession::synchronizeProfileFonts(Self self, AuditToken caller, Call call)
+{
+    Task<Permission> asking = permissionOf(self, caller);
+    const auto permission = co_await std::move(asking);
+    if (permission.error || !permission.everybody) {
+        call->fail(permission.error.value_or(denied("that is for the daemon and administrators")));
+        co_return;
+    }
+    const auto& parts = self->service_->parts();
+    auto outcome = parts.profileFonts.synchronize();
+    Task<void> reporting = parts.reports.report(std::move(outcome.change), ChangeReports::Kind::profileFonts);
+    co_await std::move(reporting);
+    if (outcome.error) {
+        call->fail({ipc_errors::failed, *outcome.error});
+    } else {
+        call->reply({});
+    }
+}
+
+Task<FontChangeOutcome> FontRegistrySession::change(Self self,
+                                                    std::function<FontChangeOutcome(FontStore&)> work)
+{
+    const auto& parts = self->service_->parts();
+    Task<void> announcing = parts.reports.announce();
+    co_await std::move(announcing);
+    auto outcome = work(parts.store);
+    if (outcome.error) {
+        TYLog_Error(parts.log, "fonts were not changed: " + *outcome.error);
+    }
+    Task<void> reporting = parts.reports.report(outcome.change, ChangeReports::Kind::userFonts);
+    co_await std::move(reporting);
+    co_return outcome;
+}
+
+Task<void> FontRegistrySession::changeAndAnswer(Self self, Call call,
+                                                std::function<FontChangeOutcome(FontStore&)> work)
+{
+    Task<FontChangeOutcome> changing = change(self, std::move(work));
+    const auto outcome = co_await std::move(changing);
+    if (outcome.error) {
+        call->fail({ipc_errors::failed, *outcome.error});
+    } else {
+        answerCount(call, outcome.change);
+    }
+}
+
+}  // namespace typhon

@@ -1,0 +1,46 @@
+#pragma once
+
+#include "platform/linux/root_directory.h"
+
+#include <chrono>
+#include <cstddef>
+#include <functional>
+#include <optional>
+#include <string>
+
+#include <sys/stat.h>
+
+namespace typhon {
+
+/// Decides when the helper has nothing left to live for. One that the service manager starts when it is
+/// needed ends after a while without connections. One that the library started ends, too, when its socket is
+/// gone, with the folder of its scratch system say, and lives on while a font daemon serves beside it. Any
+/// one thread.
+class HelperLife {
+public:
+    struct Options {
+        std::chrono::seconds idle = std::chrono::seconds(60);
+        /// The service manager holds the socket.
+        bool isSocketActivated = false;
+    };
+    HelperLife(RootDirectory root, Options options);
+
+    /// Writes the file that tells the process identifier. Null, or why it cannot.
+    std::optional<std::string> announce() const;
+    void withdraw() const;
+
+    /// Why it is time to end, or null. `connections` are those open now.
+    std::optional<std::string> reasonToEnd(std::size_t connections,
+                                           std::chrono::steady_clock::time_point now);
+
+private:
+    bool isSocketMine() const;
+    bool isDaemonRunning() const;
+
+    const RootDirectory root_;
+    const Options options_;
+    std::optional<ino_t> socket_;
+    std::optional<std::chrono::steady_clock::time_point> idleSince_;
+};
+
+}  // namespace typhon

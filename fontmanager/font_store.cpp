@@ -1,0 +1,350 @@
+#include "fontmanager/font_store.h"
+
+#include "fontmanager/directory_names.h"
+#include "fontmanager/font_paths.h"
+#include "platform/linux/directory_listing.h"
+#include "platform/linux/regular_file.h"
+#include "platform/linux/visible_text.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <map>
+#include <utility>
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace typhon {
+
+namespace {
+
+constexpr mode_t directoryPermissions = 0755;
+constexpr std::size_t mostFiles = 1U << 20;
+
+bool isEnabled(const PropertyList& entry)
+{
+    const auto* disabled = entry.find("disabled");
+    return disabled == nullptr || !disabled->isTrue();
+}
+
+/// Records a font and what that means for others.
+std::optional<std::string> put(PropertyList::Dictionary& entries, const RegisteredFont& font,
+                               FontChange& change)
+{
+    const auto before = entries.find(font.path);
+    const bool wasEnabled = before != entries.end() && isEnabled(before->second);
+    if (!font.disabled) {
+        change.available.push_back(font.path);
+    } else if (wasEnabled) {
+        change.gone.push_back(font.path);
+    }
+    change.isRegistryChanged = true;
+    return putFont(entries, font);
+}
+
+void drop(PropertyList::Dictionary& entries, const std::string& path, FontChange& change)
+{
+    if (entries.erase(path) > 0) {
+        change.gone.push_back(path);
+        change.isRegistryChanged = true;
+    }
+}
+
+std::string notRegistered(const std::string& path)
+{
+    return visibleText(path) + " is not registered";
+}
+
+}  // namespace
+
+FontStore::FontStore(RootDirectory root, ReadFontNames readNames, Log& log, RegistrationLimits limits)
+    : root_(root), readNames_(std::move(readNames)), limits_(limits), log_(log), directories_(root),
+      registry_(root), journal_(std::move(root))
+{}
+
+FontChangeOutcome FontStore::open()
+{
+    const std::lock_guard lock(mutex_);
+    if (auto error = makeDirectories(root_.real(font_paths::userFonts), directoryPermissions)) {
+        return {.change = {}, .error = std::move(error)};
+    }
+    lock_.emplace(root_.real(font_paths::writerLock));
+    if (lock_->error()) {
+        return {.change = {}, .error = *lock_->error() + "; another process changes the fonts already"};
+    }
+    auto outcome = completeInterruptedChange();
+    if (!outcome.error) {
+        sweepCopies();
+    }
+    return outcome;
+}
+
+FontStore::Beginning FontStore::begin(const std::string& identifier, bool enabled)
+{
+    const auto name = directoryNameFromIdentifier(identifier);
+    if (!name) {
+        return {nullptr, "no application can have the identifier \"" + visibleText(identifier, 300) + "\""};
+    }
+    auto opening = directories_.open(*name, true);
+    if (!opening.lease) {
+        return {nullptr, std::move(opening.error)};
+    }
+    const std::lock_guard lock(mutex_);
+    return {
+        std::make_unique<FontRegistration>(std::move(opening.lease), enabled, ++serial_, readNames_, limits_),
+        std::nullopt};
+}
+
+FontChangeOutcome FontStore::commit(FontRegistration& registration)
+{
+    const std::lock_guard lock(mutex_);
+    auto interrupted = completeInterruptedChange();
+    if (interrupted.error) {
+        return interrupted;
+    }
+    PendingChange pending{.placements = registration.fonts(), .removals = {}};
+    for (const auto& staged : pending.placements) {
+        const auto name = font_paths::placeOfFontFile(staged.font.path)->name;
+        struct stat status {};
+        if (::fstatat(registration.directory(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
+            S_ISDIR(status.st_mode)) {
+            return {.change = {}, .error = visibleText(name) + ": a directory is in its place"};
+        }
+    }
+    auto outcome = apply(pending, false);
+    // Once it is in the journal, the change will be completed, by the next run at the latest.
+    if (!outcome.error || journal_.read().change) {
+        registration.release();
+    }
+    return outcome;
+}
+
+FontChangeOutcome FontStore::unregister(const std::vector<std::string>& paths)
+{
+    const std::lock_guard lock(mutex_);
+    auto interrupted = completeInterruptedChange();
+    if (interrupted.error) {
+        return interrupted;
+    }
+    for (const auto& path : paths) {
+        if (!font_paths::placeOfFontFile(path)) {
+            return {.change = {}, .error = visibleText(path) + " is not a provider's font file"};
+        }
+    }
+    auto missing = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
+        const auto stranger =
+            std::ranges::find_if(paths, [&](const auto& path) { return !entries.contains(path); });
+        return stranger == paths.end() ? std::nullopt : std::optional(notRegistered(*stranger));
+    });
+    return missing ? FontChangeOutcome{.change = {}, .error = std::move(missing)}
+                   : apply({.placements = {}, .removals = paths}, false);
+}
+
+FontChangeOutcome FontStore::unregisterAll(const std::string& identifier)
+{
+    const std::lock_guard lock(mutex_);
+    auto interrupted = completeInterruptedChange();
+    const auto directory = directoryNameFromIdentifier(identifier);
+    if (interrupted.error || !directory) {
+        // An identifier that has no directory has no fonts.
+        return interrupted;
+    }
+    PendingChange pending;
+    const auto prefix = font_paths::fontFiles + *directory + "/";
+    auto error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
+        for (auto at = entries.lower_bound(prefix); at != entries.end() && at->first.starts_with(prefix);
+             ++at) {
+            pending.removals.push_back(at->first);
+        }
+        return std::nullopt;
+    });
+    if (error || pending.removals.empty()) {
+        return {.change = {}, .error = std::move(error)};
+    }
+    return apply(pending, false);
+}
+
+FontChangeOutcome FontStore::setEnabled(const std::vector<std::string>& paths, bool enabled)
+{
+    const std::lock_guard lock(mutex_);
+    auto outcome = completeInterruptedChange();
+    if (outcome.error) {
+        return outcome;
+    }
+    FontChange change;
+    outcome.error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
+        for (const auto& path : paths) {
+            const auto found = entries.find(path);
+            const auto* entry = found == entries.end() ? nullptr : found->second.asDictionary();
+            if (entry == nullptr) {
+                return notRegistered(path);
+            }
+            if (isEnabled(found->second) == enabled) {
+                continue;
+            }
+            auto changed = *entry;
+            changed.insert_or_assign("disabled", !enabled);
+            found->second = std::move(changed);
+            change.isRegistryChanged = true;
+            (enabled ? change.available : change.gone).push_back(path);
+        }
+        return std::nullopt;
+    });
+    return outcome.error ? outcome : FontChangeOutcome{.change = std::move(change), .error = std::nullopt};
+}
+
+FontChangeOutcome FontStore::synchronizeProviders()
+{
+    const std::lock_guard lock(mutex_);
+    auto outcome = completeInterruptedChange();
+    if (outcome.error) {
+        return outcome;
+    }
+    FontChange change;
+    outcome.error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
+        std::vector<std::string> lost;
+        for (const auto& [path, entry] : entries) {
+            if (font_paths::placeOfFontFile(path) && !isFileThere(path)) {
+                lost.push_back(path);
+            }
+        }
+        for (const auto& path : lost) {
+            drop(entries, path, change);
+        }
+        return std::nullopt;
+    });
+    for (const auto& name : directories_.names()) {
+        // Goes, if it is empty, when it is left.
+        directories_.open(name, false);
+    }
+    return outcome.error ? outcome : FontChangeOutcome{.change = std::move(change), .error = std::nullopt};
+}
+
+FontChangeOutcome FontStore::completeInterruptedChange()
+{
+    auto reading = journal_.read();
+    if (!reading.change) {
+        return {.change = {}, .error = std::move(reading.error)};
+    }
+    TYLog(log_, "completing a change of fonts that was interrupted");
+    dropLostPlacements(*reading.change);
+    return apply(std::move(*reading.change), true);
+}
+
+FontChangeOutcome FontStore::apply(PendingChange pending, bool isJournalled)
+{
+    FontChangeOutcome outcome;
+    const auto edit = [&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
+        for (const auto& staged : pending.placements) {
+            if (auto error = put(entries, staged.font, outcome.change)) {
+                return error;
+            }
+        }
+        for (const auto& path : pending.removals) {
+            drop(entries, path, outcome.change);
+        }
+        return std::nullopt;
+    };
+    const auto beforeReplacing = [&] {
+        auto error = isJournalled ? std::nullopt : journal_.write(pending);
+        return error ? error : place(pending);
+    };
+    outcome.error = registry_.update(edit, beforeReplacing);
+    if (outcome.error) {
+        outcome.change = {};
+        return outcome;
+    }
+    removeFiles(pending.removals);
+    if (const auto error = journal_.erase()) {
+        // Completing it once more changes nothing.
+        TYLog_Error(log_, *error);
+    }
+    return outcome;
+}
+
+std::optional<std::string> FontStore::place(const PendingChange& change)
+{
+    std::map<std::string, std::unique_ptr<ProviderDirectories::Lease>> leases;
+    for (const auto& staged : change.placements) {
+        const auto place = font_paths::placeOfFontFile(staged.font.path);
+        auto& lease = leases[place->directory];
+        if (!lease) {
+            auto opening = directories_.open(place->directory, true);
+            if (!opening.lease) {
+                return opening.error;
+            }
+            lease = std::move(opening.lease);
+        }
+        // An interrupted change may have renamed it already; that it is there has been seen to.
+        if (::renameat(lease->descriptor(), staged.temporary.c_str(), lease->descriptor(),
+                       place->name.c_str()) != 0 &&
+            errno != ENOENT) {
+            const int error = errno;
+            return "cannot put " + visibleText(place->name) + " in its place: " + errorText(error);
+        }
+    }
+    for (const auto& [name, lease] : leases) {
+        if (auto error = flushOpenDirectory(lease->descriptor(), name)) {
+            return error;
+        }
+    }
+    return std::nullopt;
+}
+
+void FontStore::removeFiles(const std::vector<std::string>& paths)
+{
+    for (const auto& path : paths) {
+        const auto place = font_paths::placeOfFontFile(path);
+        const auto opening =
+            place ? directories_.open(place->directory, false) : ProviderDirectories::Opening{};
+        if (!opening.lease) {
+            continue;
+        }
+        if (::unlinkat(opening.lease->descriptor(), place->name.c_str(), 0) != 0 && errno != ENOENT) {
+            const int error = errno;
+            TYLog_Error(log_, "cannot remove " + visibleText(path) + ": " + errorText(error));
+        }
+    }
+}
+
+bool FontStore::isFileThere(const std::string& path)
+{
+    const auto place = font_paths::placeOfFontFile(path);
+    const auto opening = directories_.open(place->directory, false);
+    struct stat status {};
+    return opening.lease &&
+           ::fstatat(opening.lease->descriptor(), place->name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0;
+}
+
+void FontStore::dropLostPlacements(PendingChange& change)
+{
+    std::erase_if(change.placements, [&](const StagedFont& staged) {
+        const auto place = font_paths::placeOfFontFile(staged.font.path);
+        const bool isLost = !isFileThere(font_paths::fontFiles + place->directory + "/" + staged.temporary) &&
+                            !isFileThere(staged.font.path);
+        if (isLost) {
+            TYLog_Error(log_, visibleText(staged.font.path) + " was lost before it was registered");
+        }
+        return isLost;
+    });
+}
+
+void FontStore::sweepCopies()
+{
+    for (const auto& name : directories_.names()) {
+        const auto opening = directories_.open(name, false);
+        if (!opening.lease) {
+            continue;
+        }
+        for (const auto& file : listDirectory(opening.lease->descriptor(), mostFiles).files) {
+            if (file.starts_with(FontRegistration::temporaryPrefix)) {
+                TYLog_Debug(log_, "removing the left-over copy " + name + "/" + visibleText(file));
+                ::unlinkat(opening.lease->descriptor(), file.c_str(), 0);
+            }
+        }
+    }
+}
+
+}  // namespace typhon

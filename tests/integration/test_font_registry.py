@@ -1,0 +1,95 @@
+"""The font-registry library with real processes: who may install fonts, and what others see of it."""
+
+import os
+import pathlib
+import plistlib
+import unittest
+
+from scratch_system import BIN, FONT_FILES, REGISTRY, ScratchSystem
+
+DEJAVU = pathlib.Path("/usr/share/fonts/truetype/dejavu")
+SANS = DEJAVU / "DejaVuSans.ttf"
+BOLD = DEJAVU / "DejaVuSans-Bold.ttf"
+PROVIDER = "system-installation"
+
+
+def registry_of(system):
+    path = system.real(REGISTRY)
+    return plistlib.loads(path.read_bytes()) if path.exists() else {}
+
+
+class FontRegistry(unittest.TestCase):
+    def setUp(self):
+        self.system = ScratchSystem()
+        self.addCleanup(self.system.close)
+        self.system.start()
+
+    def sandboxed(self, program, *words, check=True):
+        return self.system.ctl("run", "--", program, *words, check=check)
+
+    def test_a_provider_in_a_sandbox_installs_a_font_that_others_see(self):
+        sample = self.system.folder / "foundry"
+        sample.write_bytes((BIN / "samples/org.example.foundry").read_bytes())
+        sample.chmod(0o755)
+        self.system.sign(sample, "org.example.foundry", [PROVIDER])
+        viewer = self.system.program("org.example.viewer", ["font-enumeration"])
+
+        done = self.sandboxed(sample, "install", SANS)
+        path = f"{FONT_FILES}/org.example.foundry/DejaVuSans.ttf"
+        self.assertIn(path, done.stdout.decode())
+        self.assertEqual(registry_of(self.system)[path],
+                         {"familyName": {"DejaVuSans": "DejaVu Sans"}, "disabled": False})
+        self.assertIn(path, self.system.checkin(viewer, sandboxed=True)["fontsInfo"])
+        contents = self.sandboxed(viewer, "--root", self.system.root, "open", path).stdout
+        self.assertEqual(contents, SANS.read_bytes())
+
+        self.assertIn("removed 1", self.sandboxed(sample, "remove").stdout.decode())
+        self.assertEqual(registry_of(self.system), {})
+        self.assertEqual(list(self.system.real(FONT_FILES).iterdir()), [])
+
+    def test_a_provider_touches_its_own_fonts_only(self):
+        self.system.ctl("fonts", "install", "--identifier", "org.example.other", SANS)
+        before = registry_of(self.system)
+        path = next(iter(before))
+        program = self.system.program("org.example.foundry", [PROVIDER])
+        for words in (["install", "--identifier", "org.example.other", BOLD], ["remove", path],
+                      ["remove", "--identifier", "org.example.other", "--all"], ["disable", path],
+                      ["remove", f"{FONT_FILES}/org.example.foundry/../org.example.other/DejaVuSans.ttf"],
+                      ["remove", f"file://{FONT_FILES}/org.example.foundry/../org.example.other/DejaVuSans.ttf"]):
+            done = self.sandboxed(program, "--root", self.system.root, "fonts", *words, check=False)
+            self.assertEqual(done.returncode, 1, words)
+            self.assertIn("AccessDenied", done.stderr.decode(), words)
+        self.assertEqual(registry_of(self.system), before)
+
+    def test_programs_that_are_no_providers_are_refused(self):
+        programs = [self.system.program("org.example.viewer", ["font-enumeration"]),
+                    self.system.program("org.example.plain", []), self.system.program()]
+        for program in programs:
+            for words in (["install", SANS], ["install", "--identifier", "org.example.viewer", SANS]):
+                done = self.sandboxed(program, "--root", self.system.root, "fonts", *words, check=False)
+                self.assertEqual(done.returncode, 1)
+                self.assertIn("AccessDenied", done.stderr.decode())
+        # Signed as an application it is no administrator outside of a sandbox either.
+        done = self.system.ctl("fonts", "install", "--identifier", "org.example.a", SANS, program=programs[0],
+                               check=False)
+        self.assertIn("AccessDenied", done.stderr.decode())
+        self.assertEqual(registry_of(self.system), {})
+
+    def test_without_the_daemon_nobody_is_known_and_so_refused(self):
+        self.system.daemon.kill()
+        done = self.system.ctl("fonts", "install", "--identifier", "org.example.a", SANS, check=False)
+        self.assertEqual(done.returncode, 1)
+        self.assertIn("see to it that typhond runs", done.stderr.decode())
+
+    def test_one_bad_file_keeps_all_of_them_out(self):
+        bad = self.system.folder / "bad.ttf"
+        bad.write_bytes(os.urandom(5000))
+        done = self.system.ctl("fonts", "install", "--identifier", "org.example.a", SANS, bad, check=False)
+        self.assertEqual(done.returncode, 1)
+        self.assertIn("bad.ttf: ", done.stderr.decode())
+        self.assertEqual(registry_of(self.system), {})
+        self.assertEqual(list(self.system.real(FONT_FILES).iterdir()), [])
+
+
+if __name__ == "__main__":
+    unittest.main()
