@@ -17,7 +17,10 @@ using Names = std::map<std::string, std::string>;
 
 class FontParserTest : public testing::Test {
 protected:
-    FontNamesReading namesIn(const std::string& path) { return parser.read(openRegularFile(path).file.get()); }
+    FontNamesReading namesIn(const std::string& path)
+    {
+        return parser.read(openRegularFile(path).file.get());
+    }
     FontNamesReading namesOf(const std::string& contents)
     {
         scratch.writeFile("/font", contents);

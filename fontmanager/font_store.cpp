@@ -31,7 +31,7 @@ bool isEnabled(const PropertyList& entry)
 
 /// Records a font and what that means for others.
 std::optional<std::string> put(PropertyList::Dictionary& entries, const RegisteredFont& font,
-                               FontChange& change)
+                               RegistryChange& change)
 {
     const auto before = entries.find(font.path);
     const bool wasEnabled = before != entries.end() && isEnabled(before->second);
@@ -44,7 +44,7 @@ std::optional<std::string> put(PropertyList::Dictionary& entries, const Register
     return putFont(entries, font);
 }
 
-void drop(PropertyList::Dictionary& entries, const std::string& path, FontChange& change)
+void drop(PropertyList::Dictionary& entries, const std::string& path, RegistryChange& change)
 {
     if (entries.erase(path) > 0) {
         change.gone.push_back(path);
@@ -64,7 +64,7 @@ FontStore::FontStore(RootDirectory root, ReadFontNames readNames, Log& log, Regi
       registry_(root), journal_(std::move(root))
 {}
 
-FontChangeOutcome FontStore::open()
+RegistryChangeOutcome FontStore::open()
 {
     const std::lock_guard lock(mutex_);
     if (auto error = makeDirectories(root_.real(font_paths::userFonts), directoryPermissions)) {
@@ -97,7 +97,7 @@ FontStore::Beginning FontStore::begin(const std::string& identifier, bool enable
         std::nullopt};
 }
 
-FontChangeOutcome FontStore::commit(FontRegistration& registration)
+RegistryChangeOutcome FontStore::commit(FontRegistration& registration)
 {
     const std::lock_guard lock(mutex_);
     auto interrupted = completeInterruptedChange();
@@ -121,7 +121,7 @@ FontChangeOutcome FontStore::commit(FontRegistration& registration)
     return outcome;
 }
 
-FontChangeOutcome FontStore::unregister(const std::vector<std::string>& paths)
+RegistryChangeOutcome FontStore::unregister(const std::vector<std::string>& paths)
 {
     const std::lock_guard lock(mutex_);
     auto interrupted = completeInterruptedChange();
@@ -138,11 +138,11 @@ FontChangeOutcome FontStore::unregister(const std::vector<std::string>& paths)
             std::ranges::find_if(paths, [&](const auto& path) { return !entries.contains(path); });
         return stranger == paths.end() ? std::nullopt : std::optional(notRegistered(*stranger));
     });
-    return missing ? FontChangeOutcome{.change = {}, .error = std::move(missing)}
+    return missing ? RegistryChangeOutcome{.change = {}, .error = std::move(missing)}
                    : apply({.placements = {}, .removals = paths}, false);
 }
 
-FontChangeOutcome FontStore::unregisterAll(const std::string& identifier)
+RegistryChangeOutcome FontStore::unregisterAll(const std::string& identifier)
 {
     const std::lock_guard lock(mutex_);
     auto interrupted = completeInterruptedChange();
@@ -166,14 +166,14 @@ FontChangeOutcome FontStore::unregisterAll(const std::string& identifier)
     return apply(pending, false);
 }
 
-FontChangeOutcome FontStore::setEnabled(const std::vector<std::string>& paths, bool enabled)
+RegistryChangeOutcome FontStore::setEnabled(const std::vector<std::string>& paths, bool enabled)
 {
     const std::lock_guard lock(mutex_);
     auto outcome = completeInterruptedChange();
     if (outcome.error) {
         return outcome;
     }
-    FontChange change;
+    RegistryChange change;
     outcome.error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
         for (const auto& path : paths) {
             const auto found = entries.find(path);
@@ -192,17 +192,18 @@ FontChangeOutcome FontStore::setEnabled(const std::vector<std::string>& paths, b
         }
         return std::nullopt;
     });
-    return outcome.error ? outcome : FontChangeOutcome{.change = std::move(change), .error = std::nullopt};
+    return outcome.error ? outcome
+                         : RegistryChangeOutcome{.change = std::move(change), .error = std::nullopt};
 }
 
-FontChangeOutcome FontStore::synchronizeProviders()
+RegistryChangeOutcome FontStore::synchronizeProviders()
 {
     const std::lock_guard lock(mutex_);
     auto outcome = completeInterruptedChange();
     if (outcome.error) {
         return outcome;
     }
-    FontChange change;
+    RegistryChange change;
     outcome.error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
         std::vector<std::string> lost;
         for (const auto& [path, entry] : entries) {
@@ -219,10 +220,11 @@ FontChangeOutcome FontStore::synchronizeProviders()
         // Goes, if it is empty, when it is left.
         directories_.open(name, false);
     }
-    return outcome.error ? outcome : FontChangeOutcome{.change = std::move(change), .error = std::nullopt};
+    return outcome.error ? outcome
+                         : RegistryChangeOutcome{.change = std::move(change), .error = std::nullopt};
 }
 
-FontChangeOutcome FontStore::completeInterruptedChange()
+RegistryChangeOutcome FontStore::completeInterruptedChange()
 {
     auto reading = journal_.read();
     if (!reading.change) {
@@ -233,9 +235,9 @@ FontChangeOutcome FontStore::completeInterruptedChange()
     return apply(std::move(*reading.change), true);
 }
 
-FontChangeOutcome FontStore::apply(PendingChange pending, bool isJournalled)
+RegistryChangeOutcome FontStore::apply(PendingChange pending, bool isJournalled)
 {
-    FontChangeOutcome outcome;
+    RegistryChangeOutcome outcome;
     const auto edit = [&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
         for (const auto& staged : pending.placements) {
             if (auto error = put(entries, staged.font, outcome.change)) {

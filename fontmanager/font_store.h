@@ -18,7 +18,7 @@
 namespace typhon {
 
 /// What a change means for those who use fonts: logical paths of font files.
-struct FontChange {
+struct RegistryChange {
     /// Came to be there or were switched on, or are others under the same name.
     std::vector<std::string> available;
     /// Were removed or switched off.
@@ -28,8 +28,8 @@ struct FontChange {
 };
 
 /// What an operation did, or why it did nothing.
-struct FontChangeOutcome {
-    FontChange change;
+struct RegistryChangeOutcome {
+    RegistryChange change;
     std::optional<std::string> error;
 };
 
@@ -45,7 +45,7 @@ public:
 
     /// Takes the store for this process, completes a change that was interrupted, and removes copies that
     /// nobody will use. The change that was completed, if any. Once, before anything else.
-    FontChangeOutcome open();
+    RegistryChangeOutcome open();
 
     struct Beginning {
         std::unique_ptr<FontRegistration> registration;
@@ -54,20 +54,20 @@ public:
     /// Begins a registration for the provider with that identifier. It must not outlive the store.
     Beginning begin(const std::string& identifier, bool enabled);
     /// Registers the files of a registration and takes them from it. Files of the same names are replaced.
-    FontChangeOutcome commit(FontRegistration& registration);
+    RegistryChangeOutcome commit(FontRegistration& registration);
 
     /// Unregisters font files in providers' directories and removes them; fails when one is not registered.
-    FontChangeOutcome unregister(const std::vector<std::string>& paths);
+    RegistryChangeOutcome unregister(const std::vector<std::string>& paths);
     /// The same for everything in a provider's directory.
-    FontChangeOutcome unregisterAll(const std::string& identifier);
+    RegistryChangeOutcome unregisterAll(const std::string& identifier);
     /// Switches registered fonts on or off; fails when one is not registered.
-    FontChangeOutcome setEnabled(const std::vector<std::string>& paths, bool enabled);
+    RegistryChangeOutcome setEnabled(const std::vector<std::string>& paths, bool enabled);
     /// Unregisters font files of providers that are gone, and removes directories that hold nothing.
-    FontChangeOutcome synchronizeProviders();
+    RegistryChangeOutcome synchronizeProviders();
 
 private:
-    FontChangeOutcome completeInterruptedChange();
-    FontChangeOutcome apply(PendingChange change, bool isJournalled);
+    RegistryChangeOutcome completeInterruptedChange();
+    RegistryChangeOutcome apply(PendingChange change, bool isJournalled);
     std::optional<std::string> place(const PendingChange& change);
     void removeFiles(const std::vector<std::string>& paths);
     bool isFileThere(const std::string& path);

@@ -39,9 +39,9 @@ void collect(int directory, const std::string& prefix, unsigned depth, std::vect
     }
 }
 
-FontChange difference(const PropertyList::Dictionary& before, const PropertyList::Dictionary& after)
+RegistryChange difference(const PropertyList::Dictionary& before, const PropertyList::Dictionary& after)
 {
-    FontChange change;
+    RegistryChange change;
     for (const auto& [path, entry] : after) {
         const auto found = before.find(path);
         if (found == before.end() || !(found->second == entry)) {
@@ -96,7 +96,7 @@ PropertyList::Dictionary ProfileFonts::readFonts()
     return fonts;
 }
 
-FontChangeOutcome ProfileFonts::synchronize()
+RegistryChangeOutcome ProfileFonts::synchronize()
 {
     const std::lock_guard lock(mutex_);
     const auto before = readFontRecord(root_, font_paths::profileFonts);
@@ -107,8 +107,8 @@ FontChangeOutcome ProfileFonts::synchronize()
     }
     auto error = replaceFile(root_.real(font_paths::profileFonts), writeBinaryPropertyList(std::move(after)),
                              recordPermissions);
-    return error ? FontChangeOutcome{.change = {}, .error = std::move(error)}
-                 : FontChangeOutcome{.change = std::move(change), .error = std::nullopt};
+    return error ? RegistryChangeOutcome{.change = {}, .error = std::move(error)}
+                 : RegistryChangeOutcome{.change = std::move(change), .error = std::nullopt};
 }
 
 }  // namespace typhon

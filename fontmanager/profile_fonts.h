@@ -20,7 +20,7 @@ public:
 
     /// Brings the record in step with the files, and tells what changed: a font with other names counts as
     /// available again. A file that is no good font is logged and left out.
-    FontChangeOutcome synchronize();
+    RegistryChangeOutcome synchronize();
 
 private:
     PropertyList::Dictionary readFonts();

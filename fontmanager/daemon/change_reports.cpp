@@ -42,7 +42,7 @@ Task<void> DaemonReports::announce()
     return send(wire::updatingUserFonts.member, {});
 }
 
-Task<void> DaemonReports::report(FontChange change, Kind kind)
+Task<void> DaemonReports::report(RegistryChange change, Kind kind)
 {
     if (!change.gone.empty()) {
         Arguments arguments;

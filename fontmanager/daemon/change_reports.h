@@ -19,7 +19,7 @@ public:
     /// A change is about to be written. Returns when nobody reads the registry.
     virtual Task<void> announce() = 0;
     /// A change was written.
-    virtual Task<void> report(FontChange change, Kind kind) = 0;
+    virtual Task<void> report(RegistryChange change, Kind kind) = 0;
 };
 
 /// Reports to the font daemon, like any other client. A daemon that is not there, or does not answer, is no
@@ -31,7 +31,7 @@ public:
     ~DaemonReports() override;
 
     Task<void> announce() override;
-    Task<void> report(FontChange change, Kind kind) override;
+    Task<void> report(RegistryChange change, Kind kind) override;
 
 private:
     Task<void> send(std::string member, Arguments arguments);

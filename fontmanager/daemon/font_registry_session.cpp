@@ -63,7 +63,7 @@ std::optional<std::string> providerOf(const std::string& path)
     return place ? identifierFromDirectoryName(place->directory) : std::nullopt;
 }
 
-void answerCount(const Call& call, const FontChange& change)
+void answerCount(const Call& call, const RegistryChange& change)
 {
     Arguments results;
     results.emplace_back(
@@ -183,10 +183,10 @@ Task<void> FontRegistrySession::commitRegistration(Self self, AuditToken /*calle
     for (const auto& staged : registration->fonts()) {
         paths.push_back(staged.font.path);
     }
-    std::function<FontChangeOutcome(FontStore&)> work = [registration](FontStore& store) {
-        return registration->fonts().empty() ? FontChangeOutcome{} : store.commit(*registration);
+    std::function<RegistryChangeOutcome(FontStore&)> work = [registration](FontStore& store) {
+        return registration->fonts().empty() ? RegistryChangeOutcome{} : store.commit(*registration);
     };
-    Task<FontChangeOutcome> changing = change(self, std::move(work));
+    Task<RegistryChangeOutcome> changing = change(self, std::move(work));
     const auto outcome = co_await std::move(changing);
     if (outcome.error) {
         call->fail({ipc_errors::failed, *outcome.error});
@@ -218,7 +218,7 @@ Task<void> FontRegistrySession::unregister(Self self, AuditToken caller, Call ca
         call->fail(permission.error ? *permission.error : *error);
         co_return;
     }
-    std::function<FontChangeOutcome(FontStore&)> work = [paths = std::move(paths)](FontStore& store) {
+    std::function<RegistryChangeOutcome(FontStore&)> work = [paths = std::move(paths)](FontStore& store) {
         return store.unregister(paths);
     };
     Task<void> changing = changeAndAnswer(self, call, std::move(work));
@@ -235,7 +235,7 @@ Task<void> FontRegistrySession::unregisterAll(Self self, AuditToken caller, Call
         call->fail(permission.error.value_or(denied("a font provider removes its own fonts only")));
         co_return;
     }
-    std::function<FontChangeOutcome(FontStore&)> work = [identifier](FontStore& store) {
+    std::function<RegistryChangeOutcome(FontStore&)> work = [identifier](FontStore& store) {
         return store.unregisterAll(identifier);
     };
     Task<void> changing = changeAndAnswer(self, call, std::move(work));
@@ -257,7 +257,7 @@ Task<void> FontRegistrySession::enableOrDisable(Self self, AuditToken caller, Ca
         co_return;
     }
     const bool enabled = value(call, 1).isTrue();
-    std::function<FontChangeOutcome(FontStore&)> work =
+    std::function<RegistryChangeOutcome(FontStore&)> work =
         [paths = std::move(paths), enabled](FontStore& store) { return store.setEnabled(paths, enabled); };
     Task<void> changing = changeAndAnswer(self, call, std::move(work));
     co_await std::move(changing);
@@ -271,10 +271,10 @@ Task<void> FontRegistrySession::synchronizeFontProviders(Self self, AuditToken c
         call->fail(permission.error.value_or(denied("that is for the daemon and administrators")));
         co_return;
     }
-    std::function<FontChangeOutcome(FontStore&)> work = [](FontStore& store) {
+    std::function<RegistryChangeOutcome(FontStore&)> work = [](FontStore& store) {
         return store.synchronizeProviders();
     };
-    Task<FontChangeOutcome> changing = change(self, std::move(work));
+    Task<RegistryChangeOutcome> changing = change(self, std::move(work));
     const auto outcome = co_await std::move(changing);
     if (outcome.error) {
         call->fail({ipc_errors::failed, *outcome.error});
@@ -302,8 +302,8 @@ Task<void> FontRegistrySession::synchronizeProfileFonts(Self self, AuditToken ca
     }
 }
 
-Task<FontChangeOutcome> FontRegistrySession::change(Self self,
-                                                    std::function<FontChangeOutcome(FontStore&)> work)
+Task<RegistryChangeOutcome> FontRegistrySession::change(Self self,
+                                                        std::function<RegistryChangeOutcome(FontStore&)> work)
 {
     const auto& parts = self->service_->parts();
     Task<void> announcing = parts.reports.announce();
@@ -318,9 +318,9 @@ Task<FontChangeOutcome> FontRegistrySession::change(Self self,
 }
 
 Task<void> FontRegistrySession::changeAndAnswer(Self self, Call call,
-                                                std::function<FontChangeOutcome(FontStore&)> work)
+                                                std::function<RegistryChangeOutcome(FontStore&)> work)
 {
-    Task<FontChangeOutcome> changing = change(self, std::move(work));
+    Task<RegistryChangeOutcome> changing = change(self, std::move(work));
     const auto outcome = co_await std::move(changing);
     if (outcome.error) {
         call->fail({ipc_errors::failed, *outcome.error});

@@ -49,9 +49,10 @@ private:
     static Task<void> synchronizeProfileFonts(Self self, AuditToken caller, Call call);
 
     /// Changes the fonts, with the reports before and after it, and tells how it went.
-    static Task<FontChangeOutcome> change(Self self, std::function<FontChangeOutcome(FontStore&)> work);
+    static Task<RegistryChangeOutcome> change(Self self,
+                                              std::function<RegistryChangeOutcome(FontStore&)> work);
     static Task<void> changeAndAnswer(Self self, Call call,
-                                      std::function<FontChangeOutcome(FontStore&)> work);
+                                      std::function<RegistryChangeOutcome(FontStore&)> work);
 
     const std::shared_ptr<FontRegistryService> service_;
     std::unique_ptr<FontRegistration> registration_;

@@ -107,7 +107,7 @@ void waitForTheEnd(HelperLife& life, const FontRegistryService& service, Log& lo
     }
 }
 
-Task<void> reportCompleted(Helper& helper, FontChange change)
+Task<void> reportCompleted(Helper& helper, RegistryChange change)
 {
     return helper.reports.report(std::move(change), ChangeReports::Kind::userFonts);
 }
