@@ -20,6 +20,9 @@ struct DataDirectory {
     /// serving, and make a reader wait.
     bool isUsers = false;
 
+    /// The data directory's own real path.
+    std::string path() const { return below.empty() ? base : base + "/" + below; }
+
     /// Opens a directory or a regular file of it. `path` is relative to the data directory.
     FileDescriptor openDirectory(const std::string& path) const;
     OpenedFile openFile(const std::string& path) const;

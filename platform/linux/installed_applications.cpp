@@ -22,12 +22,18 @@ constexpr std::int64_t mostMetadataBytesInAll = 256u << 20;
 /// A user's data costs everybody's daemon time.
 constexpr std::int64_t mostMetadataBytesOfUser = 32u << 20;
 constexpr std::string_view entrySuffix = ".desktop";
+constexpr const char* entriesFolder = "applications";
 
 /// Not there, or not for this process: the same to whoever asks, and as lasting.
 bool isAbsence(int error)
 {
     return error == ENOENT || error == ENOTDIR || error == EACCES || error == EPERM || error == ELOOP ||
            error == EXDEV;
+}
+
+bool isPassing(int error)
+{
+    return error == EMFILE || error == ENFILE || error == ENOMEM || error == EINTR || error == EIO;
 }
 
 bool isMetadata(std::string_view name)
@@ -48,8 +54,10 @@ std::optional<std::string> InstalledApplications::refresh()
         return scan_->complaint;
     }
     Scan scan;
-    scanEntries("applications", "", 0, scan);
-    scanMetadata(scan);
+    scanEntries(entriesFolder, "", 0, scan);
+    if (contents_ == Contents::entriesAndMetadata) {
+        scanMetadata(scan);
+    }
     auto complaint = scan.complaint;
     if (scan.isComplete || !scan_) {
         scan_ = std::move(scan);
@@ -165,6 +173,39 @@ std::optional<DesktopEntry> InstalledApplications::entry(const std::string& bund
     }
     const auto contents = readWhole(opened.file.get(), mostEntryBytes);
     return contents.error == 0 ? parseDesktopEntry(text(contents)) : std::nullopt;
+}
+
+std::set<std::string> InstalledApplications::identifiers() const
+{
+    std::set<std::string> identifiers;
+    if (!scan_) {
+        return identifiers;
+    }
+    for (const auto& [identifier, path] : scan_->entries) {
+        const auto opened = where_.openFile(path);
+        const auto contents =
+            opened.error == 0 ? readWhole(opened.file.get(), mostEntryBytes) : FileContents{};
+        const int error = opened.error != 0 ? opened.error : contents.error;
+        // What the machine could not do just now says nothing about the application.
+        if (error == 0 ? parseDesktopEntry(text(contents)).has_value() : isPassing(error)) {
+            identifiers.insert(identifier);
+        }
+    }
+    return identifiers;
+}
+
+std::vector<std::string> InstalledApplications::entryDirectories() const
+{
+    std::vector<std::string> directories;
+    if (!scan_) {
+        return directories;
+    }
+    for (const auto& [path, identity] : scan_->directories) {
+        if (identity && (path == entriesFolder || path.starts_with(std::string(entriesFolder) + "/"))) {
+            directories.push_back(path);
+        }
+    }
+    return directories;
 }
 
 std::optional<std::string> InstalledApplications::version(const std::string& bundleIdentifier)

@@ -9,8 +9,10 @@
 #include <cstdint>
 #include <map>
 #include <optional>
+#include <set>
 #include <string>
 #include <utility>
+#include <vector>
 
 namespace typhon {
 
@@ -18,7 +20,12 @@ namespace typhon {
 /// the files as they stand when asked for. Not thread-safe.
 class InstalledApplications {
 public:
-    explicit InstalledApplications(DataDirectory where) : where_(std::move(where)) {}
+    enum class Contents { entriesAndMetadata, entries };
+
+    /// Without metadata there are no versions.
+    explicit InstalledApplications(DataDirectory where, Contents contents = Contents::entriesAndMetadata)
+        : where_(std::move(where)), contents_(contents)
+    {}
 
     /// Scans the directory if something was added, removed or renamed since. Null, or what is wrong with it:
     /// too much is left out; and where a scan was not possible, the one before stands.
@@ -26,6 +33,11 @@ public:
 
     /// The desktop entry of the application; null when it is not installed here.
     std::optional<DesktopEntry> entry(const std::string& bundleIdentifier) const;
+    /// Every application that has an entry here, and those whose entry could not be read just now.
+    std::set<std::string> identifiers() const;
+    /// The directories of desktop entries that were there, as paths for `DataDirectory::openDirectory`; the
+    /// one above all others first. None when there is no such directory.
+    std::vector<std::string> entryDirectories() const;
     /// The version that the application's metadata gives.
     std::optional<std::string> version(const std::string& bundleIdentifier);
 
@@ -58,6 +70,7 @@ private:
     const Metadata& metadataIn(const std::string& path);
 
     DataDirectory where_;
+    Contents contents_;
     std::optional<Scan> scan_;
     /// By path. Kept from scan to scan, so that only new files are parsed.
     std::map<std::string, Metadata> metadata_;

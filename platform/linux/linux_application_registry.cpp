@@ -17,12 +17,40 @@ std::optional<SWApplicationRecord> LinuxApplicationRegistry::record(const std::s
 {
     const std::lock_guard lock(mutex_);
     refresh();
+    auto known = find(bundleIdentifier, allowPlaceholder);
+    return known ? std::optional(std::move(known->record)) : std::nullopt;
+}
+
+std::vector<LinuxApplicationRegistry::Known> LinuxApplicationRegistry::applications()
+{
+    const std::lock_guard lock(mutex_);
+    refresh();
+    std::set<std::string> identifiers;
+    for (const auto& source : sources_) {
+        identifiers.merge(source.applications.identifiers());
+    }
+    std::vector<Known> applications;
+    for (const auto& identifier : identifiers) {
+        // A real one counts before a placeholder, in whatever directory.
+        auto known = find(identifier, false);
+        known = known ? std::move(known) : find(identifier, true);
+        if (known) {
+            applications.push_back(std::move(*known));
+        }
+    }
+    return applications;
+}
+
+std::optional<LinuxApplicationRegistry::Known>
+LinuxApplicationRegistry::find(const std::string& bundleIdentifier, bool allowPlaceholder)
+{
     for (std::size_t index = 0; index < sources_.size(); ++index) {
         const auto entry = sources_[index].applications.entry(bundleIdentifier);
         if (entry && (allowPlaceholder || !entry->isPlaceholder)) {
-            return SWApplicationRecord{.bundleIdentifier = bundleIdentifier,
-                                       .shortVersionString = versionOf(bundleIdentifier, index),
-                                       .isPlaceholder = entry->isPlaceholder};
+            return Known{.record = {.bundleIdentifier = bundleIdentifier,
+                                    .shortVersionString = versionOf(bundleIdentifier, index),
+                                    .isPlaceholder = entry->isPlaceholder},
+                         .directory = sources_[index].where.path()};
         }
     }
     return std::nullopt;

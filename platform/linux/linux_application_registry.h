@@ -24,7 +24,16 @@ public:
     std::optional<SWApplicationRecord> record(const std::string& bundleIdentifier,
                                               bool allowPlaceholder) override;
 
+    /// An application and the data directory whose entry counts.
+    struct Known {
+        SWApplicationRecord record;
+        std::string directory;
+    };
+    /// All applications, placeholders included, by identifier.
+    std::vector<Known> applications();
+
 private:
+    std::optional<Known> find(const std::string& bundleIdentifier, bool allowPlaceholder);
     void refresh();
     void refreshDirectories();
     std::optional<std::string> versionOf(const std::string& bundleIdentifier, std::size_t first);

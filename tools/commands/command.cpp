@@ -62,7 +62,8 @@ void addCommands(CLI::App& parser, Invocation& invocation)
 {
     for (const auto add :
          {addKeygenCommand, addTrustCommand, addSignCommand, addRunCommand, addCheckinCommand, addOpenCommand,
-          addLedgerCommand, addPreferencesCommand, addPlistCommand, addFontsCommand}) {
+          addLedgerCommand, addPreferencesCommand, addPlistCommand, addFontsCommand, addApplicationsCommand,
+          addPostNotificationCommand}) {
         add(parser, invocation);
     }
 }

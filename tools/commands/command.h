@@ -64,6 +64,8 @@ void addLedgerCommand(CLI::App& parser, Invocation& invocation);
 void addPreferencesCommand(CLI::App& parser, Invocation& invocation);
 void addPlistCommand(CLI::App& parser, Invocation& invocation);
 void addFontsCommand(CLI::App& parser, Invocation& invocation);
+void addApplicationsCommand(CLI::App& parser, Invocation& invocation);
+void addPostNotificationCommand(CLI::App& parser, Invocation& invocation);
 
 /// Parses a command line (without the program's own name), runs its command and gives the program's exit
 /// code.

@@ -3,14 +3,20 @@
 #include "platform/linux/linux_work_queues.h"
 #include "platform/linux/root_directory.h"
 #include "platform/linux/system_bus.h"
+#include "tools/relayd/application_watch.h"
 #include "tools/relayd/notification_relay.h"
 
+#include <algorithm>
+#include <chrono>
 #include <csignal>
+#include <cstddef>
+#include <cstdint>
 #include <cstdlib>
 #include <filesystem>
 #include <map>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include <CLI/CLI.hpp>
 
@@ -23,6 +29,7 @@ namespace {
 struct Options {
     std::string root;
     LogLevel logLevel = LogLevel::defaultLevel;
+    double removalWindow = 10;
 };
 
 Options parsed(int argc, char** argv)
@@ -37,6 +44,11 @@ Options parsed(int argc, char** argv)
     app.add_option("--log-level", options.logLevel, "Least level that is logged: debug, default or error")
         ->type_name("LEVEL")
         ->transform(CLI::Transformer(levels));
+    app.add_option("--removal-window", options.removalWindow,
+                   "Seconds for which an application's desktop entry may be missing, as in an upgrade")
+        ->type_name("SECONDS")
+        ->check(CLI::Range(0.0, 3600.0))
+        ->capture_default_str();
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& error) {
@@ -48,6 +60,21 @@ Options parsed(int argc, char** argv)
     return options;
 }
 
+constexpr const char* applicationUnregistered = "com.vorlan.Startwell.applicationUnregistered";
+/// Identifiers in one announcement.
+constexpr std::size_t mostAtOnce = 1000;
+
+void announceRemoved(NotificationRelay& relay, const std::vector<std::string>& identifiers)
+{
+    for (std::size_t first = 0; first < identifiers.size(); first += mostAtOnce) {
+        const auto begin = identifiers.begin() + static_cast<std::ptrdiff_t>(first);
+        const auto count = std::min(mostAtOnce, identifiers.size() - first);
+        relay.announceDistributed(
+            applicationUnregistered,
+            {{"bundleIDs", arrayOfStrings({begin, begin + static_cast<std::ptrdiff_t>(count)})}});
+    }
+}
+
 void run(const Options& options)
 {
     static const RootDirectory root(options.root);
@@ -56,7 +83,12 @@ void run(const Options& options)
     static LinuxWorkQueues queues(pool);
     static const auto relay = std::make_shared<NotificationRelay>(isRootOrOwnUser, log);
     static const auto bus = std::make_shared<SystemBus>(pool, queues, log, root.real(systemBusSocket));
+    static const auto applications = std::make_shared<ApplicationWatch>(
+        ApplicationWatch::Services{pool, queues, log}, bus->queue(), root,
+        std::chrono::nanoseconds(static_cast<std::int64_t>(options.removalWindow * 1e9)),
+        [](const std::vector<std::string>& identifiers) { announceRemoved(*relay, identifiers); });
     bus->start(relay);
+    applications->start();
     queues.runMainLoop();
 }
 
