@@ -2,6 +2,7 @@
 
 #include "fontmanager/name_records.h"
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <memory>
@@ -53,15 +54,54 @@ std::size_t readAt(int descriptor, std::uint64_t offset, unsigned char* buffer, 
     return filled;
 }
 
-/// As FreeType wants it: bytes read, or with a count of zero, whether seeking failed.
-unsigned long readForStream(FT_Stream stream, unsigned long offset, unsigned char* buffer,
-                            unsigned long count)
-{
-    if (count == 0) {
-        return offset > stream->size ? 1 : 0;
+/// The file as FreeType reads it: in many small pieces, most of them near the last one, which come from a
+/// block that is kept.
+class FontStream {
+public:
+    FontStream(int descriptor, std::uint64_t size) : descriptor_(descriptor)
+    {
+        stream_.size = static_cast<unsigned long>(size);
+        stream_.descriptor.pointer = this;
+        stream_.read = readForFreeType;
     }
-    return readAt(static_cast<int>(stream->descriptor.value), offset, buffer, count);
-}
+    FontStream(const FontStream&) = delete;
+    FontStream& operator=(const FontStream&) = delete;
+
+    FT_StreamRec* get() { return &stream_; }
+
+private:
+    /// As FreeType wants it: bytes read, or with a count of zero, whether seeking failed.
+    static unsigned long readForFreeType(FT_Stream stream, unsigned long offset, unsigned char* buffer,
+                                         unsigned long count)
+    {
+        if (count == 0) {
+            return offset > stream->size ? 1 : 0;
+        }
+        return static_cast<FontStream*>(stream->descriptor.pointer)->read(offset, buffer, count);
+    }
+
+    unsigned long read(std::uint64_t offset, unsigned char* buffer, std::size_t count)
+    {
+        if (count > block_.size()) {
+            return readAt(descriptor_, offset, buffer, count);
+        }
+        if (offset < blockOffset_ || offset - blockOffset_ > filled_ ||
+            filled_ - (offset - blockOffset_) < count) {
+            blockOffset_ = offset;
+            filled_ = readAt(descriptor_, offset, block_.data(), block_.size());
+        }
+        const std::size_t start = offset - blockOffset_;
+        const std::size_t available = std::min(count, filled_ - start);
+        std::copy_n(block_.data() + start, available, buffer);
+        return available;
+    }
+
+    const int descriptor_;
+    FT_StreamRec stream_{};
+    std::array<unsigned char, 4096> block_{};
+    std::uint64_t blockOffset_ = 0;
+    std::size_t filled_ = 0;
+};
 
 bool isTrueTypeOrOpenType(int descriptor)
 {
@@ -74,11 +114,11 @@ bool isTrueTypeOrOpenType(int descriptor)
 }
 
 /// A face of the font, or the font without any of its faces for index -1. `stream` outlives it.
-std::pair<Face, FT_Error> openFace(const Library& library, FT_StreamRec& stream, long index)
+std::pair<Face, FT_Error> openFace(const Library& library, FontStream& stream, long index)
 {
     FT_Open_Args arguments{};
     arguments.flags = FT_OPEN_STREAM;
-    arguments.stream = &stream;
+    arguments.stream = stream.get();
     FT_Face face = nullptr;
     const FT_Error error = FT_Open_Face(library.get(), &arguments, index, &face);
     return {Face(error == 0 ? face : nullptr), error};
@@ -91,7 +131,7 @@ std::string whyUnreadable(FT_Error error)
            (text != nullptr ? std::string(text) : "FreeType error " + std::to_string(error));
 }
 
-FontNamesReading readFaces(const Library& library, FT_StreamRec& stream, const FontLimits& limits)
+FontNamesReading readFaces(const Library& library, FontStream& stream, const FontLimits& limits)
 {
     const auto [font, error] = openFace(library, stream, -1);
     if (!font) {
@@ -145,10 +185,7 @@ FontNamesReading readFontNamesOfSize(int descriptor, std::uint64_t size, const F
         return failure(whyUnreadable(error));
     }
     const Library library(opened);
-    FT_StreamRec stream{};
-    stream.size = static_cast<unsigned long>(size);
-    stream.descriptor.value = descriptor;
-    stream.read = readForStream;
+    FontStream stream(descriptor, size);
     return readFaces(library, stream, limits);
 }
 

@@ -17,7 +17,7 @@ class FontZygote;
 
 /// What reading the names of one font file may cost.
 struct FontParserLimits {
-    FontLimits font;
+    FontLimits font{};
     /// Of the reading process, in time that passes and in processor time.
     std::chrono::seconds time{5};
     /// Address space of the reading process, in bytes.

@@ -4,10 +4,8 @@
 #include "fontmanager/font_request.h"
 #include "fontmanager/parser_confinement.h"
 #include "platform/linux/file_descriptor.h"
-#include "platform/linux/pidfd.h"
 
 #include <array>
-#include <cerrno>
 #include <csignal>
 #include <cstring>
 #include <new>
@@ -15,22 +13,26 @@
 #include <span>
 #include <utility>
 
-#include <poll.h>
+#include <malloc.h>
 #include <sys/socket.h>
-#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 // Making a process by fork from one that is small, has one thread and is confined already costs a fraction of
-// starting a program, and hands the reader nothing of the caller's memory. This process itself never looks at
-// a font or at an answer: the answer goes straight from the reader to the caller.
+// starting a program, and hands the reader nothing of the caller's memory. Each reader is made ahead and
+// itself waits for a request, the caller gets its answer directly: this process never looks at a font or an
+// answer. It only says how the reader ended.
 
 namespace typhon {
 
 namespace {
 
+// How a reader exits.
+constexpr int doneStatus = 0;
+constexpr int failedStatus = 1;
 constexpr int outOfMemoryStatus = 3;
 constexpr int unconfinedStatus = 4;
+constexpr int noRequestStatus = 5;
 
 struct ReceivedRequest {
     FontRequest request;
@@ -92,45 +94,38 @@ bool writeAll(std::span<const std::uint8_t> bytes)
     return true;
 }
 
-[[noreturn]] void runReader(const ReceivedRequest& received, int zygote, const FontReadingFunction& readFont)
+/// What a reader does, to its exit status.
+int runReader(int zygote, const FontReadingFunction& readFont)
 {
-    const auto& request = received.request;
-    if (confineReader(received.font.get(), received.answer.get(), request.memory, request.seconds, zygote) !=
-        0) {
-        ::_exit(unconfinedStatus);
+    const auto received = receive();
+    if (!received) {
+        return noRequestStatus;
+    }
+    const auto& request = received->request;
+    if (confineReader(received->font.get(), received->answer.get(), request.memory, request.seconds,
+                      zygote) != 0) {
+        return unconfinedStatus;
     }
     const FontLimits limits{.bytes = request.bytes,
                             .faces = static_cast<long>(request.faces),
                             .nameBytes = static_cast<std::size_t>(request.nameBytes)};
     try {
         const auto answer = encodeFontAnswer(readFont(readerFont, request.fileSize, limits));
-        ::_exit(writeAll(answer) ? 0 : 1);
+        ::_exit(writeAll(answer) ? doneStatus : failedStatus);
     } catch (const std::bad_alloc&) {
         ::_exit(outOfMemoryStatus);
     }
 }
 
-/// Waits for a reader, by its pidfd, for as long as it may take, and no longer than there is somebody to
-/// report to. True when it has ended by itself.
-bool waitForEnd(int reader, std::uint32_t seconds)
-{
-    std::array<pollfd, 2> events{pollfd{reader, POLLIN, 0}, pollfd{zygoteControl, POLLRDHUP, 0}};
-    // The kernel counts the rest down in it.
-    timespec rest{static_cast<time_t>(seconds), 0};
-    while (::syscall(SYS_ppoll, events.data(), events.size(), &rest, nullptr, 0) < 0 && errno == EINTR) {
-    }
-    return events[0].revents != 0;
-}
-
-FontReadingReport reportOf(int status, bool wasEnded)
+FontReadingReport reportOf(int status)
 {
     if (WIFSIGNALED(status)) {
         const int signal = WTERMSIG(status);
-        const bool isLate = signal == SIGXCPU || (signal == SIGKILL && wasEnded);
+        const bool isLate = signal == SIGXCPU || signal == SIGALRM;
         return {isLate ? FontReadingEnd::timedOut : FontReadingEnd::crashed, signal};
     }
     switch (WEXITSTATUS(status)) {
-    case 0:
+    case doneStatus:
         return {FontReadingEnd::done, 0};
     case outOfMemoryStatus:
         return {FontReadingEnd::outOfMemory, 0};
@@ -141,40 +136,34 @@ FontReadingReport reportOf(int status, bool wasEnded)
     }
 }
 
-FontReadingReport serve(ReceivedRequest received, const FontReadingFunction& readFont)
+/// Makes a reader and waits for its end; how it ended, or null when there is nothing more to do.
+std::optional<FontReadingReport> serveOne(const FontReadingFunction& readFont)
 {
     const int zygote = ::getpid();
     const int reader = ::fork();
     if (reader == 0) {
-        runReader(received, zygote, readFont);
-    }
-    if (reader < 0) {
-        return {FontReadingEnd::notStarted, errno};
-    }
-    // Else the pipe would not end with the reader.
-    received.answer = FileDescriptor();
-    const auto handle = openPidfd(reader);
-    const bool hasEnded = waitForEnd(handle.get(), received.request.seconds);
-    if (!hasEnded) {
-        ::kill(reader, SIGKILL);
+        ::_exit(runReader(zygote, readFont));
     }
     int status = 0;
-    if (::waitpid(reader, &status, 0) != reader) {
-        return {FontReadingEnd::notStarted, errno};
+    if (reader < 0 || ::waitpid(reader, &status, 0) != reader ||
+        (WIFEXITED(status) && WEXITSTATUS(status) == noRequestStatus)) {
+        return std::nullopt;
     }
-    return reportOf(status, !hasEnded);
+    return reportOf(status);
 }
 
 }  // namespace
 
 int runFontZygote(const FontReadingFunction& readFont)
 {
+    // When memory runs out, the C library would look for more in a way that the filter forbids.
+    ::mallopt(M_ARENA_MAX, 1);
     const int error = confineZygote();
     if (!send(FontZygoteGreeting{error == 0 ? fontRequestVersion : 0, error}) || error != 0) {
         return 1;
     }
-    while (auto received = receive()) {
-        if (!send(serve(std::move(*received), readFont))) {
+    while (const auto report = serveOne(readFont)) {
+        if (!send(*report)) {
             break;
         }
     }

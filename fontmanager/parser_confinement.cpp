@@ -7,12 +7,14 @@
 #include <limits>
 
 #include <linux/capability.h>
+#include <linux/futex.h>
 #include <linux/mount.h>
 #include <sched.h>
 #include <sys/mman.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
 #include <sys/syscall.h>
+#include <sys/time.h>
 #include <unistd.h>
 
 // The filters are what holds: they forbid every way to name a file, a socket or a process. The namespaces are
@@ -96,6 +98,8 @@ void allowMemory(SyscallFilter& filter)
     filter.allow(SYS_brk)
         .allow(SYS_mmap, {{2, Kind::hasNone, PROT_EXEC}, {3, Kind::hasAll, MAP_ANONYMOUS}})
         .allow(SYS_munmap)
+        // The first exception, which is that there is no memory, says that what it needs is set up.
+        .allow(SYS_futex, {{1, Kind::equals, FUTEX_WAKE_PRIVATE}})
         .allow(SYS_mremap)
         .allow(SYS_madvise);
 }
@@ -131,14 +135,16 @@ int installZygoteFilter()
 {
     SyscallFilter filter;
     constexpr uint32_t forkOnly = CLONE_CHILD_SETTID | CLONE_CHILD_CLEARTID | SIGCHLD;
-    filter.allow(SYS_recvmsg, {{0, Kind::equals, zygoteControl}})
+    filter.allow(SYS_pread64)
+        .allow(SYS_write)
+        .allow(SYS_recvmsg, {{0, Kind::equals, zygoteControl}})
         .allow(SYS_sendto, {{0, Kind::equals, zygoteControl}})
         .allow(SYS_clone, {{0, Kind::equals, forkOnly}})
-        .allow(SYS_prctl, {{0, Kind::equals, PR_SET_PDEATHSIG}});
+        .allow(SYS_prctl, {{0, Kind::equals, PR_SET_PDEATHSIG}})
+        .allow(SYS_prlimit64, {{0, Kind::equals, 0}});
     for (const long call :
-         {SYS_wait4, SYS_pidfd_open, SYS_kill, SYS_ppoll, SYS_close, SYS_dup3, SYS_close_range, SYS_prlimit64,
-          SYS_getppid, SYS_getpid, SYS_seccomp, SYS_set_robust_list, SYS_rt_sigprocmask, SYS_pread64,
-          SYS_write, SYS_exit_group}) {
+         {SYS_wait4, SYS_close, SYS_dup3, SYS_close_range, SYS_setitimer, SYS_getpid, SYS_getppid,
+          SYS_seccomp, SYS_set_robust_list, SYS_rt_sigprocmask, SYS_exit_group}) {
         filter.allow(call);
     }
     allowMemory(filter);
@@ -171,6 +177,10 @@ int confineReader(int font, int answer, std::uint64_t memory, uint32_t seconds, 
     // It may have ended before that.
     if (::getppid() != zygote) {
         return ESRCH;
+    }
+    const itimerval timer{.it_interval = {}, .it_value = {static_cast<time_t>(seconds), 0}};
+    if (::setitimer(ITIMER_REAL, &timer, nullptr) != 0) {
+        return errno;
     }
     if (const int error = limitReader(memory, seconds)) {
         return error;

@@ -20,8 +20,9 @@ constexpr int readerAnswer = 1;
 int confineZygote();
 
 /// For a reader, right after the fork, with the font and the pipe at any descriptors above 1. Leaves it those
-/// two, `memory` bytes of address space, `seconds` of processor time, and the calls that reading the one,
-/// writing the other, taking memory and ending need. It ends when its maker, `zygote`, does.
+/// two, `memory` bytes of address space, `seconds` of time and of processor time, and the calls that reading
+/// the one, writing the other, taking memory and ending need. It ends when its maker, `zygote`, does, and by
+/// SIGALRM or SIGXCPU when the time is up.
 int confineReader(int font, int answer, std::uint64_t memory, std::uint32_t seconds, int zygote);
 
 }  // namespace typhon

@@ -25,7 +25,7 @@ public:
     /// Allows the call when all of the conditions hold. A call may be named several times.
     SyscallFilter& allow(long number, const std::vector<Condition>& conditions = {});
 
-    /// Installs it for this thread and what it starts, for ever. 0 or an errno. The process must have given
+    /// Installs it for this thread and what it starts, forever. 0 or an errno. The process must have given
     /// up new privileges before.
     int install();
 
