@@ -14,6 +14,7 @@
 #include <unistd.h>
 
 #include FT_FREETYPE_H
+#include FT_MODULE_H
 
 // Font files come from anybody, and FreeType reads many formats. Only the two that applications install are
 // let through to it, told by their first four bytes, and it reads the file a piece at a time: a mapped file
@@ -113,15 +114,31 @@ bool isTrueTypeOrOpenType(int descriptor)
     return tag == std::string_view("\0\1\0\0", 4) || tag == "true" || tag == "OTTO" || tag == "ttcf";
 }
 
-/// A face of the font, or the font without any of its faces for index -1. `stream` outlives it.
-std::pair<Face, FT_Error> openFace(const Library& library, FontStream& stream, long index)
+std::pair<Face, FT_Error> openFaceAs(const char* format, const Library& library, FontStream& stream,
+                                     long index)
 {
     FT_Open_Args arguments{};
-    arguments.flags = FT_OPEN_STREAM;
+    arguments.flags = FT_OPEN_STREAM | FT_OPEN_DRIVER;
     arguments.stream = stream.get();
+    arguments.driver = FT_Get_Module(library.get(), format);
     FT_Face face = nullptr;
-    const FT_Error error = FT_Open_Face(library.get(), &arguments, index, &face);
+    const FT_Error error = arguments.driver == nullptr
+                               ? FT_Err_Missing_Module
+                               : FT_Open_Face(library.get(), &arguments, index, &face);
     return {Face(error == 0 ? face : nullptr), error};
+}
+
+/// A face of the font, or the font without any of its faces for index -1. `stream` outlives it. Left to
+/// choose the format itself, FreeType would look for pieces of a damaged font in other files too.
+std::pair<Face, FT_Error> openFace(const Library& library, FontStream& stream, long index)
+{
+    auto trueType = openFaceAs("truetype", library, stream, index);
+    if (trueType.first) {
+        return trueType;
+    }
+    auto compact = openFaceAs("cff", library, stream, index);
+    const bool isOther = compact.second == FT_Err_Unknown_File_Format;
+    return isOther ? std::move(trueType) : std::move(compact);
 }
 
 std::string whyUnreadable(FT_Error error)

@@ -125,6 +125,8 @@ int installReaderFilter()
     SyscallFilter filter;
     filter.allow(SYS_pread64, {{0, Kind::equals, readerFont}})
         .allow(SYS_write, {{0, Kind::equals, readerAnswer}})
+        // The C library's sorting asks how much memory there is.
+        .allow(SYS_sysinfo)
         .allow(SYS_exit_group);
     allowMemory(filter);
     allowSanitizers(filter);
@@ -144,7 +146,7 @@ int installZygoteFilter()
         .allow(SYS_prlimit64, {{0, Kind::equals, 0}});
     for (const long call :
          {SYS_wait4, SYS_close, SYS_dup3, SYS_close_range, SYS_setitimer, SYS_getpid, SYS_getppid,
-          SYS_seccomp, SYS_set_robust_list, SYS_rt_sigprocmask, SYS_exit_group}) {
+          SYS_seccomp, SYS_set_robust_list, SYS_rt_sigprocmask, SYS_sysinfo, SYS_exit_group}) {
         filter.allow(call);
     }
     allowMemory(filter);
