@@ -4,6 +4,7 @@
 #include "sdk/client_errors.h"
 #include "sdk/service_socket.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdint>
 #include <limits>
@@ -19,6 +20,14 @@ namespace {
 
 constexpr const char* objectPath = "/com/vorlan/typhond";
 constexpr std::uint64_t withoutLimit = std::numeric_limits<std::uint64_t>::max();
+
+std::uint64_t microseconds(const ServiceConnection::Patience& patience)
+{
+    // Zero would mean the library's own limit.
+    return patience ? static_cast<std::uint64_t>(
+                          std::max<std::int64_t>(1, std::chrono::microseconds(*patience).count()))
+                    : withoutLimit;
+}
 
 struct UnrefMessage {
     void operator()(sd_bus_message* message) const { sd_bus_message_unref(message); }
@@ -79,23 +88,29 @@ ClientResult<ServiceConnection> ServiceConnection::open(const RootDirectory& roo
     if (!socket) {
         return socket.error();
     }
+    return overSocket(std::move(*socket), std::string(serviceName));
+}
+
+ClientResult<ServiceConnection> ServiceConnection::overSocket(FileDescriptor socket, const std::string& peer)
+{
     sd_bus* made = nullptr;
     int outcome = sd_bus_new(&made);
     Bus bus(made);
-    outcome = outcome < 0 ? outcome : startBus(bus.get(), *socket);
+    outcome = outcome < 0 ? outcome : startBus(bus.get(), socket);
     if (outcome < 0) {
-        return systemError(-outcome, "cannot talk to " + std::string(serviceName));
+        return systemError(-outcome, "cannot talk to " + peer);
     }
     return ServiceConnection(bus.release());
 }
 
 ServiceConnection::ServiceConnection(ServiceConnection&& other) noexcept
-    : bus_(std::exchange(other.bus_, nullptr))
+    : bus_(std::exchange(other.bus_, nullptr)), handler_(std::move(other.handler_))
 {}
 
 ServiceConnection& ServiceConnection::operator=(ServiceConnection&& other) noexcept
 {
     std::swap(bus_, other.bus_);
+    std::swap(handler_, other.handler_);
     return *this;
 }
 
@@ -109,15 +124,18 @@ bool ServiceConnection::isOpen() const
     return bus_ != nullptr && sd_bus_is_open(bus_) > 0;
 }
 
-ClientResult<Arguments> ServiceConnection::call(const wire::Operation& operation, const Arguments& arguments)
+ClientResult<Arguments> ServiceConnection::call(const wire::Operation& operation, const Arguments& arguments,
+                                                Patience patience)
 {
-    auto results = callAndRead(operation, arguments);
-    discardIncoming();
+    auto results = callAndRead(operation, arguments, patience);
+    // Left alone, what the daemon calls meanwhile would fill the queue. What became of the connection the
+    // next call says.
+    static_cast<void>(process());
     return results;
 }
 
 ClientResult<Arguments> ServiceConnection::callAndRead(const wire::Operation& operation,
-                                                       const Arguments& arguments)
+                                                       const Arguments& arguments, Patience patience)
 {
     const auto what = std::string(operation.interface) + "." + operation.member;
     sd_bus_message* made = nullptr;
@@ -134,7 +152,7 @@ ClientResult<Arguments> ServiceConnection::callAndRead(const wire::Operation& op
     }
     sd_bus_message* answered = nullptr;
     BusError error;
-    outcome = sd_bus_call(bus_, call.get(), withoutLimit, error.out(), &answered);
+    outcome = sd_bus_call(bus_, call.get(), microseconds(patience), error.out(), &answered);
     const Message reply(answered);
     if (outcome < 0) {
         return error.asClientError(-outcome, what);
@@ -147,11 +165,34 @@ ClientResult<Arguments> ServiceConnection::callAndRead(const wire::Operation& op
     return std::move(*results);
 }
 
-/// What the daemon told us meanwhile is of no use to a blocking client, but would fill the queue.
-void ServiceConnection::discardIncoming()
+ClientResult<Done> ServiceConnection::process()
 {
-    while (bus_ != nullptr && sd_bus_process(bus_, nullptr) > 0) {
+    for (;;) {
+        sd_bus_message* received = nullptr;
+        const int outcome = bus_ == nullptr ? -ENOTCONN : sd_bus_process(bus_, &received);
+        const Message message(received);
+        if (outcome < 0) {
+            return systemError(-outcome, "the connection ended");
+        }
+        if (message && sd_bus_message_is_method_call(message.get(), nullptr, nullptr) > 0) {
+            const PeerCall call(message.get());
+            handler_ ? handler_(call) : call.refuse();
+        }
+        if (outcome == 0) {
+            return Done{};
+        }
     }
+}
+
+int ServiceConnection::descriptor() const
+{
+    return bus_ == nullptr ? -1 : sd_bus_get_fd(bus_);
+}
+
+short ServiceConnection::events() const
+{
+    const int events = bus_ == nullptr ? 0 : sd_bus_get_events(bus_);
+    return static_cast<short>(events < 0 ? 0 : events);
 }
 
 }  // namespace typhon

@@ -1,11 +1,13 @@
 #include "sdk/typhon_client.h"
 
 #include "platform/linux/bus_message.h"
-#include "platform/linux/regular_file.h"
 #include "sdk/client_errors.h"
 #include "sdk/font_grant.h"
+#include "sdk/font_opener.h"
+#include "sdk/received_changes.h"
 #include "sdk/service_connection.h"
 #include "sdk/service_socket.h"
+#include "sdk/waiting.h"
 
 #include <cerrno>
 
@@ -15,24 +17,18 @@ namespace typhon {
 
 namespace {
 
-constexpr const char* brokerService = "com.vorlan.typhond.file-access";
-constexpr wire::Operation openFile{"com.vorlan.typhond.FileAccess", "open", "ays", "h"};
-
 ClientResult<Done> withoutResults(const ClientResult<Arguments>& outcome)
 {
     return outcome ? ClientResult<Done>(Done{}) : outcome.error();
 }
 
-/// The descriptor of an `h` argument, for the caller to own.
-ClientResult<FileDescriptor> ownDescriptor(const Argument& argument)
+void receive(ReceivedChanges& changes, const PeerCall& call)
 {
-    const auto& file = std::get<std::shared_ptr<TransferredFile>>(argument);
-    const auto received = std::dynamic_pointer_cast<LinuxTransferredFile>(file);
-    FileDescriptor own(received ? ::fcntl(received->descriptor.get(), F_DUPFD_CLOEXEC, 3) : -1);
-    if (!own) {
-        return systemError(errno, "cannot keep the received file");
+    if (const auto arguments = call.argumentsOf(wire::fontAddedInfo)) {
+        changes.add(*arguments);
+    } else {
+        call.refuse();
     }
-    return own;
 }
 
 }  // namespace
@@ -48,12 +44,20 @@ ClientResult<TyphonClient> TyphonClient::connect(const Options& options)
 }
 
 TyphonClient::TyphonClient(RootDirectory root, ServiceConnection daemon)
-    : root_(std::move(root)), daemon_(std::make_unique<ServiceConnection>(std::move(daemon)))
-{}
+    : daemon_(std::make_unique<ServiceConnection>(std::move(daemon))),
+      opener_(std::make_unique<FontOpener>(std::move(root))), changes_(std::make_unique<ReceivedChanges>())
+{
+    daemon_->setCallHandler([changes = changes_.get()](const PeerCall& call) { receive(*changes, call); });
+}
 
 TyphonClient::TyphonClient(TyphonClient&&) noexcept = default;
 TyphonClient& TyphonClient::operator=(TyphonClient&&) noexcept = default;
 TyphonClient::~TyphonClient() = default;
+
+const RootDirectory& TyphonClient::root() const
+{
+    return opener_->root();
+}
 
 ClientResult<std::optional<PropertyList>> TyphonClient::checkin()
 {
@@ -67,6 +71,8 @@ ClientResult<std::optional<PropertyList>> TyphonClient::checkinForFontPicker()
 
 ClientResult<std::optional<PropertyList>> TyphonClient::checkinWith(const wire::Operation& operation)
 {
+    // Before the call: a change that comes right behind the answer is not part of it.
+    changes_->forgetGrants();
     const auto outcome = call(operation, {});
     if (!outcome) {
         return outcome.error();
@@ -85,6 +91,70 @@ ClientResult<Done> TyphonClient::resetIssuedFontsFor(const std::string& identifi
     return withoutResults(call(wire::resetIssuedFontsFor, {PropertyList(identifier)}));
 }
 
+ClientResult<Done> TyphonClient::fontChanged(const std::vector<std::string>& urls, bool added, int kind)
+{
+    const PropertyList change =
+        PropertyList::Dictionary{{"urls", arrayOfStrings(urls)}, {"added", added}, {"kind", kind}};
+    return withoutResults(call(wire::fontChanged, {change}));
+}
+
+ClientResult<std::optional<FontChangeNotice>>
+TyphonClient::waitForChange(std::optional<std::chrono::milliseconds> timeout)
+{
+    const auto deadline = deadlineAfter(timeout);
+    for (;;) {
+        const auto processed = daemon_->process();
+        auto change = changes_->take();
+        if (change) {
+            return change;
+        }
+        if (!processed) {
+            return processed.error();
+        }
+        const auto waited = waitFor({{daemon_->descriptor(), daemon_->events(), 0}}, deadline);
+        if (!waited) {
+            return waited.error();
+        }
+        if (!*waited) {
+            return std::optional<FontChangeNotice>();
+        }
+    }
+}
+
+ClientResult<std::vector<FontChangeNotice>> TyphonClient::processPending()
+{
+    const auto processed = daemon_->process();
+    std::vector<FontChangeNotice> changes;
+    while (auto change = changes_->take()) {
+        changes.push_back(*std::move(change));
+    }
+    if (!processed && changes.empty()) {
+        return processed.error();
+    }
+    return changes;
+}
+
+int TyphonClient::descriptor() const
+{
+    return daemon_->descriptor();
+}
+
+std::size_t TyphonClient::lostChanges() const
+{
+    return changes_->lost();
+}
+
+ClientResult<Done> TyphonClient::checkinForSilkpageProcess(const FileDescriptor& endpoint,
+                                                           std::optional<std::chrono::milliseconds> timeout)
+{
+    FileDescriptor copy(::fcntl(endpoint.get(), F_DUPFD_CLOEXEC, 3));
+    if (!copy) {
+        return systemError(errno, "cannot pass the endpoint on");
+    }
+    std::shared_ptr<TransferredFile> file = std::make_shared<LinuxTransferredFile>(std::move(copy));
+    return withoutResults(daemon_->call(wire::checkinForSilkpageProcess, {std::move(file)}, timeout));
+}
+
 ClientResult<Arguments> TyphonClient::call(const wire::Operation& operation, const Arguments& arguments)
 {
     return daemon_->call(operation, arguments);
@@ -92,40 +162,16 @@ ClientResult<Arguments> TyphonClient::call(const wire::Operation& operation, con
 
 ClientResult<FileDescriptor> TyphonClient::openFont(const std::string& path)
 {
-    const auto grant = fontGrantFor(lastCheckin_.value_or(PropertyList()), path);
-    return grant.way == FontGrant::Way::ownAccess ? openWithOwnAccess(path) : redeem(grant.token, path);
+    auto grant = fontGrantFor(lastCheckin_.value_or(PropertyList()), path);
+    if (grant.way == FontGrant::Way::broker && grant.token.bytes.empty()) {
+        grant = fontGrantFor(changes_->grants(), path);
+    }
+    return opener_->open(grant, path);
 }
 
 ClientResult<FileDescriptor> TyphonClient::redeem(const Data& token, const std::string& path)
 {
-    const auto service = broker();
-    if (!service) {
-        return service.error();
-    }
-    const auto outcome = (*service)->call(openFile, {PropertyList(token), PropertyList(path)});
-    return outcome ? ownDescriptor(outcome->front()) : outcome.error();
-}
-
-ClientResult<FileDescriptor> TyphonClient::openWithOwnAccess(const std::string& path) const
-{
-    const auto real = root_.real(path);
-    auto opened = openRegularFile(real);
-    if (opened.error != 0) {
-        return systemError(opened.error, "cannot open " + real);
-    }
-    return std::move(opened.file);
-}
-
-ClientResult<ServiceConnection*> TyphonClient::broker()
-{
-    if (!broker_ || !broker_->isOpen()) {
-        auto made = ServiceConnection::open(root_, brokerService);
-        if (!made) {
-            return made.error();
-        }
-        broker_ = std::make_unique<ServiceConnection>(std::move(*made));
-    }
-    return broker_.get();
+    return opener_->redeem(token, path);
 }
 
 }  // namespace typhon

@@ -5,13 +5,19 @@
 #include "platform/linux/root_directory.h"
 #include "protocol/wire.h"
 #include "sdk/client_result.h"
+#include "sdk/font_change_notice.h"
 
+#include <chrono>
+#include <cstddef>
 #include <memory>
 #include <optional>
 #include <string>
+#include <vector>
 
 namespace typhon {
 
+class FontOpener;
+class ReceivedChanges;
 class ServiceConnection;
 
 /// An application's connection to the font daemon. Every call blocks until the daemon has answered, without
@@ -43,8 +49,32 @@ public:
     /// whether this process was entitled to that.
     ClientResult<Done> resetIssuedFontsFor(const std::string& identifier);
 
+    /// `fontChanged:reply:`. Reports that fonts came (`added`) or went, by their file URLs; `kind` is 0 for
+    /// user-installed fonts, else profile fonts. Answered before anybody is told.
+    ClientResult<Done> fontChanged(const std::vector<std::string>& urls, bool added, int kind = 0);
+
+    /// The next change of fonts that the daemon told of since the first check-in, oldest first. Waits for
+    /// one, if need be for so long (null: without limit); null when the time is over, or a signal handler
+    /// ran.
+    ClientResult<std::optional<FontChangeNotice>>
+    waitForChange(std::optional<std::chrono::milliseconds> timeout = std::nullopt);
+    /// All changes that have arrived, oldest first, without waiting.
+    ClientResult<std::vector<FontChangeNotice>> processPending();
+    /// Becomes readable when something arrives, or the connection ends. For the program's own poll, once
+    /// `processPending` has been called after the last other call of this object. Owned by this object.
+    int descriptor() const;
+    /// How many changes went unread: 1,024 are kept for a program that does not ask for them.
+    std::size_t lostChanges() const;
+
+    /// `checkinForSilkpageProcess:reply:`. Has the daemon pass this application's fonts on to the web-content
+    /// process behind that endpoint (see sdk/web_content_process.h). Answered when that process has them, so
+    /// never when it is silent: fails with `timeout` after so long, if given.
+    ClientResult<Done>
+    checkinForSilkpageProcess(const FileDescriptor& endpoint,
+                              std::optional<std::chrono::milliseconds> timeout = std::nullopt);
+
     /// A read-only descriptor of the font file at the logical `path`, through the grant that the last
-    /// check-in gave. Fails with `accessDenied` for a file that was not granted, and with
+    /// check-in, or a change since, gave. Fails with `accessDenied` for a file that was not granted, and with
     /// `client_errors::expired` when the daemon was restarted since: check in again with a new client.
     ClientResult<FileDescriptor> openFont(const std::string& path);
     /// The same with a token of the caller's choice, empty for a file that needs none.
@@ -55,18 +85,15 @@ public:
 
     /// The dictionary of the last successful check-in; null before it, or when it was null.
     const std::optional<PropertyList>& lastCheckin() const { return lastCheckin_; }
-    const RootDirectory& root() const { return root_; }
+    const RootDirectory& root() const;
 
 private:
     TyphonClient(RootDirectory root, ServiceConnection daemon);
     ClientResult<std::optional<PropertyList>> checkinWith(const wire::Operation& operation);
-    ClientResult<FileDescriptor> openWithOwnAccess(const std::string& path) const;
-    ClientResult<ServiceConnection*> broker();
 
-    RootDirectory root_;
     std::unique_ptr<ServiceConnection> daemon_;
-    /// Made when the first file is opened.
-    std::unique_ptr<ServiceConnection> broker_;
+    std::unique_ptr<FontOpener> opener_;
+    std::unique_ptr<ReceivedChanges> changes_;
     std::optional<PropertyList> lastCheckin_;
 };
 

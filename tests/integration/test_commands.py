@@ -12,7 +12,7 @@ import unittest
 
 from scratch_system import BIN, FONT_FILES, ScratchSystem, entry
 
-COMMANDS = ("keygen", "trust", "sign", "run", "checkin", "open", "ledger", "preferences", "plist", "fonts")
+COMMANDS = ("keygen", "trust", "sign", "run", "checkin", "open", "monitor", "ledger", "preferences", "plist", "fonts")
 PATH = f"{FONT_FILES}/org.example.foundry/a.ttf"
 
 
@@ -53,7 +53,7 @@ class Commands(unittest.TestCase):
         self.assert_fails(2, "preferences", "set", "key", "x", "--type", "nonsense")
 
     def test_without_a_daemon_they_say_how_to_start_it(self):
-        for arguments in (["checkin"], ["open", PATH], ["run", "--", "true"]):
+        for arguments in (["checkin"], ["open", PATH], ["monitor"], ["run", "--", "true"]):
             self.assertIn("Start typhond", self.assert_fails(1, *arguments))
 
     # -- keys and signatures

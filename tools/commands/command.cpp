@@ -62,8 +62,8 @@ void addCommands(CLI::App& parser, Invocation& invocation)
 {
     for (const auto add :
          {addKeygenCommand, addTrustCommand, addSignCommand, addRunCommand, addCheckinCommand, addOpenCommand,
-          addLedgerCommand, addPreferencesCommand, addPlistCommand, addFontsCommand, addApplicationsCommand,
-          addPostNotificationCommand}) {
+          addMonitorCommand, addLedgerCommand, addPreferencesCommand, addPlistCommand, addFontsCommand,
+          addApplicationsCommand, addPostNotificationCommand}) {
         add(parser, invocation);
     }
 }
@@ -72,7 +72,8 @@ void addCommands(CLI::App& parser, Invocation& invocation)
 
 int runCommandLine(const std::vector<std::string>& words)
 {
-    CLI::App parser{"Keys, signatures, sandboxes, check-ins and preferences of typhond", "typhonctl"};
+    CLI::App parser{"Keys, signatures, sandboxes, check-ins, changes and preferences of typhond",
+                    "typhonctl"};
     Invocation invocation;
     parser
         .add_option("--root", invocation.rootOption,

@@ -60,6 +60,7 @@ void addSignCommand(CLI::App& parser, Invocation& invocation);
 void addRunCommand(CLI::App& parser, Invocation& invocation);
 void addCheckinCommand(CLI::App& parser, Invocation& invocation);
 void addOpenCommand(CLI::App& parser, Invocation& invocation);
+void addMonitorCommand(CLI::App& parser, Invocation& invocation);
 void addLedgerCommand(CLI::App& parser, Invocation& invocation);
 void addPreferencesCommand(CLI::App& parser, Invocation& invocation);
 void addPlistCommand(CLI::App& parser, Invocation& invocation);

@@ -1,8 +1,9 @@
 #include "faces_in_file.h"
 #include "fontmanager/font_registry_client.h"
 #include "platform/linux/visible_text.h"
-#include "sdk/typhon_client.h"
+#include "sample.h"
 
+#include <cstdlib>
 #include <iostream>
 #include <string_view>
 #include <utility>
@@ -18,7 +19,6 @@ namespace typhon::sample {
 
 namespace {
 
-constexpr std::string_view identifier = TYPHON_SAMPLE_IDENTIFIER;
 constexpr const char* usage = R"(A sample application of typhon.
 
   checkin           what it sees, one line a face, and which extensions it got
@@ -27,11 +27,19 @@ constexpr const char* usage = R"(A sample application of typhon.
   install FILE...   install fonts of its own, as a font provider does
   remove            remove all fonts of its own
   reset IDENTIFIER  ask the daemon to forget the fonts issued to an application
+  monitor           say what it is told of each change of fonts, a line each, and read what came
+  monitor COUNT     the same, and end after so many changes
+  content           start a web-content process of its own and pass its fonts on to it
 
 The system is that of the folder $TYPHON_ROOT, else of this machine.
 )";
 
-using View = std::optional<PropertyList>;
+bool isFontPicker()
+{
+    return identifier == "com.vorlan.Panekit.FontPicker";
+}
+
+}  // namespace
 
 int complain(const ClientError& error)
 {
@@ -40,11 +48,6 @@ int complain(const ClientError& error)
         std::cerr << "  " << error.advice << "\n";
     }
     return 1;
-}
-
-bool isFontPicker()
-{
-    return identifier == "com.vorlan.Panekit.FontPicker";
 }
 
 ClientResult<View> checkIn(TyphonClient& client)
@@ -58,6 +61,8 @@ PropertyList::Dictionary fontsIn(const PropertyList& view)
     return fonts == nullptr || fonts->asDictionary() == nullptr ? PropertyList::Dictionary{}
                                                                 : *fonts->asDictionary();
 }
+
+namespace {
 
 void printFont(const std::string& path, const PropertyList& entry)
 {
@@ -244,7 +249,8 @@ int runCommand(const std::vector<std::string>& words)
     if (is("remove", 1)) {
         return removeFonts();
     }
-    if (!is("checkin", 1) && !is("read", 1) && !is("try", 2) && !is("reset", 2)) {
+    if (!is("checkin", 1) && !is("read", 1) && !is("try", 2) && !is("reset", 2) && !is("monitor", 1) &&
+        !is("monitor", 2) && !is("content", 1)) {
         std::cerr << usage;
         return 2;
     }
@@ -257,6 +263,12 @@ int runCommand(const std::vector<std::string>& words)
     }
     if (words.front() == "read") {
         return readFonts(*client);
+    }
+    if (words.front() == "monitor") {
+        return monitor(*client, words.size() == 2 ? std::strtoul(words[1].c_str(), nullptr, 10) : 0);
+    }
+    if (words.front() == "content") {
+        return showContent(*client);
     }
     return words.front() == "try" ? tryFile(*client, words[1]) : reset(*client, words[1]);
 }

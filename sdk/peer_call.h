@@ -1,0 +1,28 @@
+#pragma once
+
+#include "platform/ipc.h"
+#include "protocol/wire.h"
+
+#include <optional>
+
+struct sd_bus_message;
+
+namespace typhon {
+
+/// A call that the other end of a connection makes of this program. Valid while it is handled.
+class PeerCall {
+public:
+    explicit PeerCall(sd_bus_message* message) : message_(message) {}
+
+    /// The arguments, if it is a call of that operation with the types of that; else null.
+    std::optional<Arguments> argumentsOf(const wire::Operation& operation) const;
+    /// Answers without results, unless no answer is expected.
+    void reply() const;
+    /// Says that there is no such operation, or that it is not called like that.
+    void refuse() const;
+
+private:
+    sd_bus_message* message_;
+};
+
+}  // namespace typhon
