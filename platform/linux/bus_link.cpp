@@ -7,20 +7,20 @@
 #include "platform/linux/bus_link.h"
 
 #include "platform/linux/introspection.h"
+#include "platform/linux/socket_handshake.h"
 #include "platform/linux/wire_text.h"
 
+#include <array>
 #include <cerrno>
 #include <cstring>
 #include <utility>
 
-#include <sys/socket.h>
+#include <fcntl.h>
+#include <sys/epoll.h>
 
 namespace typhon {
 
 namespace {
-
-/// Bytes; what the kernel gives by default.
-constexpr int sendBuffer = 212992;
 
 const IpcError disconnectedError{ipc_errors::disconnected, "the connection is gone"};
 
@@ -29,19 +29,50 @@ std::string errorText(int error)
     return std::strerror(error < 0 ? -error : error);
 }
 
+std::unique_ptr<Handshake> newHandshake(BusLink::Role role)
+{
+    if (role == BusLink::Role::client) {
+        return std::make_unique<ClientHandshake>();
+    }
+    sd_id128_t identifier;
+    sd_id128_randomize(&identifier);
+    std::array<char, SD_ID128_STRING_MAX> text;
+    return std::make_unique<ServerHandshake>(sd_id128_to_string(identifier, text.data()));
+}
+
+/// What a peer has done wrong when its input ends like that; null when that is no offence.
+const char* offenceOf(MessageReception::Outcome outcome)
+{
+    using Outcome = MessageReception::Outcome;
+    switch (outcome) {
+    case Outcome::malformed:
+        return "it sent something that is no message";
+    case Outcome::tooLarge:
+        return "its message is too large";
+    case Outcome::tooManyDescriptors:
+        return "its message has too many descriptors";
+    case Outcome::tooMuchHeld:
+        return "it left too many messages unfinished";
+    default:
+        return nullptr;
+    }
+}
+
 }  // namespace
 
 BusLink::BusLink(std::shared_ptr<IpcContext> context, FileDescriptor socket, Role role, AuditToken peerToken,
                  std::weak_ptr<Owner> owner)
     : peer(peerToken), context_(std::move(context)), role_(role), owner_(std::move(owner)),
-      socket_(std::move(socket)), sizeGuard_(context_->limits.message.bytes)
+      socket_(std::move(socket)),
+      reception_({context_->limits.message.bytes, context_->limits.message.descriptors},
+                 std::make_unique<HeldBytes::Claim>(context_->heldBytes, peerToken))
 {}
 
 BusLink::~BusLink()
 {
     watch_.reset();
     context_->dispose(std::move(handshakeTimer_));
-    sd_bus_close_unref(bus_);
+    context_->dispose(std::move(messageTimer_));
 }
 
 /// Runs `body` under the lock, then what it left for afterwards.
@@ -64,60 +95,21 @@ void BusLink::start()
         if (ended_) {
             return;
         }
-        const int result = open();
-        if (result < 0) {
-            abandonLocked("the handshake could not begin: " + errorText(result), afterwards);
-            return;
-        }
-        handshakeTimer_ = startTimer(context_->limits.handshake, [](BusLink& link) {
-            link.locked([&](Afterwards& later) {
-                if (!link.ready_) {
-                    link.abandonLocked("it did not finish the handshake in time", later);
-                }
-            });
-        });
-        arm();
+        ::fcntl(socket_.get(), F_SETFL, O_NONBLOCK);
+        handshake_ = newHandshake(role_);
+        startTimer(handshakeTimer_, context_->limits.handshake, "it did not finish the handshake in time");
+        watch(socket_.get());
+        proceedWithHandshake(afterwards);
     });
 }
 
-int BusLink::open()
+void BusLink::watch(int descriptor)
 {
-    int result = sd_bus_new(&bus_);
-    if (result < 0) {
-        return result;
-    }
-    result = sd_bus_set_fd(bus_, socket_.get(), socket_.get());
-    if (result < 0) {
-        return result;
-    }
-    const int descriptor = socket_.release();
-    sd_bus_negotiate_fds(bus_, 1);
-    if (role_ == Role::server) {
-        sd_id128_t identifier;
-        sd_id128_randomize(&identifier);
-        sd_bus_set_server(bus_, 1, identifier);
-        // Who the peer claims to be is of no interest: it may be user 0 of a user namespace. Decisions are
-        // made by what the kernel says about the socket.
-        sd_bus_set_anonymous(bus_, 1);
-    }
-    sd_bus_add_filter(bus_, nullptr, sawMessage, this);
-    result = sd_bus_start(bus_);
-    if (result >= 0) {
-        // Where privileges allow, sd-bus enlarges it a hundredfold, and each peer could leave that unread.
-        ::setsockopt(descriptor, SOL_SOCKET, SO_SNDBUF, &sendBuffer, sizeof sendBuffer);
-        watch_ = context_->pool.watch(descriptor, [weak = weak_from_this()](std::uint32_t) {
-            if (const auto self = weak.lock()) {
-                self->handleEvents();
-            }
-        });
-    }
-    return result;
-}
-
-int BusLink::sawMessage(sd_bus_message*, void* link, sd_bus_error*)
-{
-    static_cast<BusLink*>(link)->sawMessage_ = true;
-    return 0;
+    watch_ = context_->pool.watch(descriptor, [weak = weak_from_this()](std::uint32_t events) {
+        if (const auto self = weak.lock()) {
+            self->handleEvents(events);
+        }
+    });
 }
 
 void BusLink::close()
@@ -125,14 +117,23 @@ void BusLink::close()
     locked([&](Afterwards& afterwards) { end(afterwards, false); });
 }
 
-void BusLink::handleEvents()
+void BusLink::handleEvents(std::uint32_t events)
 {
     // The next event may be handled, by another thread, while this one goes on with what has arrived.
     locked([&](Afterwards& afterwards) {
         if (ended_) {
             return;
         }
-        processInput(afterwards);
+        if (!ready_) {
+            proceedWithHandshake(afterwards);
+            return;
+        }
+        if ((events & EPOLLOUT) != 0) {
+            processOutput(afterwards);
+        }
+        if (!ended_) {
+            processInput(afterwards);
+        }
         if (!ended_) {
             checkOutgoing(afterwards);
         }
@@ -144,67 +145,102 @@ void BusLink::handleEvents()
 
 void BusLink::arm()
 {
-    watch_->arm(static_cast<std::uint32_t>(sd_bus_get_events(bus_)));
+    watch_->arm(static_cast<std::uint32_t>(sd_bus_get_events(bus_.get())));
 }
 
-/// Reads one message, or as far as there is input. Right after the handshake, all of it.
-void BusLink::processInput(Afterwards& afterwards)
+void BusLink::proceedWithHandshake(Afterwards& afterwards)
 {
-    constexpr int maximumSteps = 4096;
-    for (int step = 0; step < maximumSteps; ++step) {
-        const auto progress = processOnce(afterwards);
-        if (progress == Progress::ended || (progress == Progress::message && !draining_)) {
-            return;
-        }
-        if (progress == Progress::none) {
-            draining_ = !ready_;
-            return;
-        }
-    }
-}
-
-BusLink::Progress BusLink::processOnce(Afterwards& afterwards)
-{
-    if (ready_ && !sizeGuard_.admits(sd_bus_get_fd(bus_))) {
-        abandonLocked("its message is too large", afterwards);
-        return Progress::ended;
-    }
-    sawMessage_ = false;
-    sd_bus_message* raw = nullptr;
-    const int result = sd_bus_process(bus_, &raw);
-    const BusMessage message(raw);
-    if (result < 0 || sd_bus_is_open(bus_) <= 0) {
-        if (result < 0) {
-            abandonLocked(errorText(result), afterwards);
-        }
-        end(afterwards, true);
-        return Progress::ended;
-    }
-    if (!ready_ && sd_bus_is_ready(bus_) > 0) {
+    const auto problem = continueHandshake(*handshake_, socket_.get());
+    if (!problem.empty()) {
+        abandonLocked(problem, afterwards);
+    } else if (handshake_->state() == Handshake::State::done) {
         becomeReady(afterwards);
-    } else if (ready_ && !sizeGuard_.hasRead(sawMessage_, draining_)) {
-        abandonLocked("its message is too large", afterwards);
+    } else {
+        watch_->arm(EPOLLIN);
     }
-    if (message && !ended_) {
-        receive(message.get(), afterwards);
-    }
-    return ended_        ? Progress::ended
-           : sawMessage_ ? Progress::message
-           : result > 0  ? Progress::some
-                         : Progress::none;
 }
 
 void BusLink::becomeReady(Afterwards& afterwards)
 {
-    ready_ = true;
+    descriptorsAllowed_ = handshake_->descriptorsAgreed();
+    reception_.allowDescriptors(descriptorsAllowed_);
+    handshake_.reset();
     context_->dispose(std::move(handshakeTimer_));
-    descriptorsAllowed_ = sd_bus_can_send(bus_, SD_BUS_TYPE_UNIX_FD) > 0;
+    watch_.reset();
+    int result = bus_.open(descriptorsAllowed_);
+    if (result >= 0) {
+        result = bus_.moveOnto(std::move(socket_));
+    }
+    if (result < 0) {
+        context_->offenders.report({}, "bus", "a connection cannot be set up: " + errorText(result));
+        end(afterwards, true);
+        return;
+    }
+    ready_ = true;
+    watch(bus_.socket());
+    arm();
     std::vector<std::uint64_t> waiting;
     for (const auto& [number, call] : pending_) {
         waiting.push_back(number);
     }
     for (const auto number : waiting) {
         transmit(number, afterwards);
+    }
+}
+
+/// Reads at most one message; what is left announces itself again.
+void BusLink::processInput(Afterwards& afterwards)
+{
+    using Outcome = MessageReception::Outcome;
+    const auto outcome = reception_.next(bus_.socket());
+    if (outcome == Outcome::ready) {
+        processReadyMessage(afterwards);
+    } else if (outcome == Outcome::assembled) {
+        processAssembledMessage(afterwards);
+    } else if (outcome == Outcome::begun) {
+        awaitRest();
+    } else if (outcome == Outcome::closed) {
+        end(afterwards, true);
+    } else if (const auto* offence = offenceOf(outcome)) {
+        punishLocked(offence, afterwards);
+    }
+}
+
+void BusLink::processReadyMessage(Afterwards& afterwards)
+{
+    sd_bus_message* raw = nullptr;
+    const int result = sd_bus_process(bus_.get(), &raw);
+    const BusMessage message(raw);
+    if (result < 0 || sd_bus_is_open(bus_.get()) <= 0) {
+        abandonLocked(errorText(result), afterwards);
+    } else if (message) {
+        receive(message.get(), afterwards);
+    }
+}
+
+void BusLink::processAssembledMessage(Afterwards& afterwards)
+{
+    context_->dispose(std::move(messageTimer_));
+    MessageDecoder decoder;
+    if (auto* message = decoder.decode(reception_.take())) {
+        receive(message, afterwards);
+    } else {
+        punishLocked("it sent something that is no message", afterwards);
+    }
+}
+
+void BusLink::awaitRest()
+{
+    if (!messageTimer_) {
+        startTimer(messageTimer_, context_->limits.wholeMessage, "it did not finish a message in time");
+    }
+}
+
+void BusLink::processOutput(Afterwards& afterwards)
+{
+    const int result = outgoing_.isEmpty() ? 0 : bus_.writeOnly(context_->idleSocket);
+    if (result < 0) {
+        abandonLocked(errorText(result), afterwards);
     }
 }
 
@@ -323,7 +359,7 @@ void BusLink::transmit(std::uint64_t number, Afterwards& afterwards)
 BusMessage BusLink::newCall(const OutgoingCall& call)
 {
     sd_bus_message* raw = nullptr;
-    if (sd_bus_message_new_method_call(bus_, &raw, nullptr, exportedObjectPath, call.interface.c_str(),
+    if (sd_bus_message_new_method_call(bus_.get(), &raw, nullptr, exportedObjectPath, call.interface.c_str(),
                                        call.member.c_str()) < 0) {
         return nullptr;
     }
@@ -334,8 +370,8 @@ BusMessage BusLink::newCall(const OutgoingCall& call)
 bool BusLink::send(BusMessage message, const MessageAppending& size, std::uint64_t* cookie,
                    Afterwards& afterwards)
 {
-    outgoing_.sending(size, sd_bus_get_fd(bus_));
-    const int result = sd_bus_send(bus_, message.get(), cookie);
+    outgoing_.sending(size, bus_.socket());
+    const int result = sd_bus_send(bus_.get(), message.get(), cookie);
     message.reset();
     if (result < 0) {
         abandonLocked("a message could not be sent: " + errorText(result), afterwards);
@@ -351,13 +387,11 @@ bool BusLink::send(BusMessage message, const MessageAppending& size, std::uint64
 void BusLink::checkOutgoing(Afterwards& afterwards)
 {
     std::uint64_t waiting = 0;
-    sd_bus_get_n_queued_write(bus_, &waiting);
+    sd_bus_get_n_queued_write(bus_.get(), &waiting);
     outgoing_.update(waiting);
     const auto excess = outgoing_.excess(context_->limits);
     if (!excess.empty()) {
-        TYLog_Error(context_->log,
-                    "connection to process " + std::to_string(peer.processIdentifier) + " closed: " + excess);
-        end(afterwards, true);
+        punishLocked(excess, afterwards);
     }
 }
 
@@ -416,11 +450,22 @@ void BusLink::failLocked(std::uint64_t cookie, const IpcError& error, Afterwards
 BusMessage BusLink::callToAnswer(std::uint64_t cookie)
 {
     sd_bus_message* raw = nullptr;
-    if (sd_bus_message_new_method_call(bus_, &raw, nullptr, "/", "call.to", "Answer") < 0) {
+    if (sd_bus_message_new_method_call(bus_.get(), &raw, nullptr, "/", "call.to", "Answer") < 0) {
         return nullptr;
     }
     BusMessage call(raw);
     return sd_bus_message_seal(raw, cookie, 1) < 0 ? nullptr : std::move(call);
+}
+
+void BusLink::punishLocked(const std::string& offence, Afterwards& afterwards)
+{
+    if (!ended_) {
+        const auto who = "process " + std::to_string(peer.processIdentifier);
+        // Numbers make no other offence of it.
+        const auto kind = offence.substr(0, offence.find_first_of("0123456789"));
+        context_->offenders.report(peer, kind, "connection to " + who + " closed: " + offence);
+        end(afterwards, true);
+    }
 }
 
 void BusLink::abandonLocked(const std::string& reason, Afterwards& afterwards)
@@ -439,10 +484,12 @@ void BusLink::end(Afterwards& afterwards, bool tellOwner)
     }
     watch_.reset();
     context_->dispose(std::move(handshakeTimer_));
+    context_->dispose(std::move(messageTimer_));
+    reception_.take();
     while (!pending_.empty()) {
         completeCall(pending_.begin()->first, {std::nullopt, disconnectedError}, afterwards);
     }
-    sd_bus_close_unref(std::exchange(bus_, nullptr));
+    bus_.close();
     socket_ = FileDescriptor();
     if (const auto owner = tellOwner ? owner_.lock() : nullptr) {
         afterwards.push_back([owner] {});
@@ -460,6 +507,18 @@ std::unique_ptr<Timer> BusLink::startTimer(std::chrono::nanoseconds delay,
     });
     timer->schedule(delay, delay / 50);
     return timer;
+}
+
+/// Punishes the peer unless `timer`, one of the link's, is disposed of in time.
+void BusLink::startTimer(std::unique_ptr<Timer>& timer, std::chrono::nanoseconds delay, const char* offence)
+{
+    timer = startTimer(delay, [&timer, offence, started = ++timersStarted_](BusLink& link) {
+        link.locked([&](Afterwards& later) {
+            if (timer && started == link.timersStarted_) {
+                link.punishLocked(offence, later);
+            }
+        });
+    });
 }
 
 }  // namespace typhon

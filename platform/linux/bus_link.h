@@ -4,8 +4,11 @@
 #include "platform/linux/bus_message.h"
 #include "platform/linux/event_pool.h"
 #include "platform/linux/file_descriptor.h"
+#include "platform/linux/handshake.h"
 #include "platform/linux/ipc_context.h"
-#include "platform/linux/message_size_guard.h"
+#include "platform/linux/message_decoder.h"
+#include "platform/linux/message_reception.h"
+#include "platform/linux/opened_bus.h"
 #include "platform/linux/outgoing_queue.h"
 
 #include <cstdint>
@@ -72,7 +75,9 @@ public:
     void replyLocked(std::uint64_t cookie, const std::string& types, const Arguments& results,
                      const std::string& member, Afterwards& afterwards);
     void failLocked(std::uint64_t cookie, const IpcError& error, Afterwards& afterwards);
-    /// Closes because of the peer's behaviour, and logs why.
+    /// Closes because of what the peer has done, and logs it, once for each kind of offence of a process.
+    void punishLocked(const std::string& offence, Afterwards& afterwards);
+    /// Closes for a reason that is nobody's fault, or of no interest.
     void abandonLocked(const std::string& reason, Afterwards& afterwards);
 
     const AuditToken peer;
@@ -85,15 +90,18 @@ private:
         std::unique_ptr<Timer> timer;
     };
 
-    enum class Progress { none, some, message, ended };
-
     template <class Body>
     void locked(Body body);
-    int open();
-    void handleEvents();
-    void processInput(Afterwards& afterwards);
-    Progress processOnce(Afterwards& afterwards);
+    void handleEvents(std::uint32_t events);
+    void proceedWithHandshake(Afterwards& afterwards);
     void becomeReady(Afterwards& afterwards);
+    void processInput(Afterwards& afterwards);
+    void processReadyMessage(Afterwards& afterwards);
+    void processAssembledMessage(Afterwards& afterwards);
+    void awaitRest();
+    void processOutput(Afterwards& afterwards);
+    void watch(int descriptor);
+    void startTimer(std::unique_ptr<Timer>& timer, std::chrono::nanoseconds delay, const char* offence);
     void receive(sd_bus_message* message, Afterwards& afterwards);
     void complete(sd_bus_message* message, Afterwards& afterwards);
     void completeCall(std::uint64_t number, CallResult result, Afterwards& afterwards);
@@ -106,7 +114,6 @@ private:
     void arm();
     void end(Afterwards& afterwards, bool tellOwner);
     std::unique_ptr<Timer> startTimer(std::chrono::nanoseconds delay, std::function<void(BusLink&)> handler);
-    static int sawMessage(sd_bus_message* message, void* link, sd_bus_error* error);
 
     const std::shared_ptr<IpcContext> context_;
     const Role role_;
@@ -114,17 +121,19 @@ private:
 
     std::mutex mutex_;
     // Below: protected by the mutex.
+    /// Until the handshake is done; then it belongs to the bus.
     FileDescriptor socket_;
-    sd_bus* bus_ = nullptr;
+    std::unique_ptr<Handshake> handshake_;
+    OpenedBus bus_;
     std::unique_ptr<EventPool::Watch> watch_;
     std::unique_ptr<Timer> handshakeTimer_;
+    std::unique_ptr<Timer> messageTimer_;
+    /// Tells a timer whose handler comes late from its successor; there is one at a time.
+    std::uint64_t timersStarted_ = 0;
     bool ready_ = false;
     bool ended_ = false;
     bool descriptorsAllowed_ = false;
-    /// The handshake may have read messages ahead, which the socket does not announce.
-    bool draining_ = true;
-    bool sawMessage_ = false;
-    MessageSizeGuard sizeGuard_;
+    MessageReception reception_;
     OutgoingQueue outgoing_;
     std::uint64_t lastNumber_ = 0;
     std::map<std::uint64_t, PendingCall> pending_;

@@ -3,7 +3,10 @@
 #include "platform/audit_token.h"
 #include "platform/linux/connection_accounting.h"
 #include "platform/linux/event_pool.h"
+#include "platform/linux/held_bytes.h"
 #include "platform/linux/ipc_limits.h"
+#include "platform/linux/offender_log.h"
+#include "platform/linux/opened_bus.h"
 #include "platform/linux/root_directory.h"
 #include "platform/log.h"
 #include "platform/work_queues.h"
@@ -72,6 +75,9 @@ struct IpcContext {
     /// Runs the handlers of timers; the queue of a connection may be held by the very item that waits.
     const std::shared_ptr<WorkQueue> deadlines;
     const std::shared_ptr<ConnectionAccounting> accounting;
+    const std::shared_ptr<HeldBytes> heldBytes;
+    OffenderLog offenders;
+    const IdleSocket idleSocket;
     LiveObjects<LinuxConnection> connections;
     LiveObjects<LinuxListener> listeners;
 

@@ -26,6 +26,11 @@ struct IpcLimits {
     MessageLimits message;
     /// From accepting or connecting to the end of the D-Bus handshake.
     std::chrono::nanoseconds handshake = std::chrono::seconds(25);
+    /// From the first bytes of a message to its last, where it does not come at once.
+    std::chrono::nanoseconds wholeMessage = std::chrono::seconds(25);
+    /// Parts of unfinished messages, of one process, and of all processes of one user.
+    std::size_t heldBytesPerProcess = 64U << 20;
+    std::size_t heldBytesPerUser = 256U << 20;
 };
 
 }  // namespace typhon

@@ -105,7 +105,6 @@ private:
     bool resumed_ = false;
     bool ended_ = false;
     bool invalidatedHere_ = false;
-    bool excessLogged_ = false;
 };
 
 }  // namespace typhon

@@ -126,21 +126,15 @@ void LinuxConnection::answerOther(BusLink& link, sd_bus_message* call, const Cal
 
 void LinuxConnection::refuseExcess(BusLink& link, sd_bus_message* call, BusLink::Afterwards& afterwards)
 {
-    bool first = false;
-    {
-        const std::lock_guard lock(mutex_);
-        first = !std::exchange(excessLogged_, true);
-    }
-    if (first) {
-        TYLog_Error(context_->log, "process " + std::to_string(link.peer.processIdentifier) +
-                                       " has too many unanswered calls; further ones are refused");
-    }
+    context_->offenders.report(link.peer, "unanswered",
+                               "process " + std::to_string(link.peer.processIdentifier) +
+                                   " has too many unanswered calls; further ones are refused");
     if (expectsReply(call)) {
         link.failLocked(cookieOf(call), {ipc_errors::limitsExceeded, "too many unanswered calls"},
                         afterwards);
     } else {
         // Dropping it silently would leave its sender in the belief that it was heard.
-        link.abandonLocked("too many calls without reply", afterwards);
+        link.punishLocked("it has too many unanswered calls", afterwards);
     }
 }
 

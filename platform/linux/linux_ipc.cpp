@@ -31,8 +31,7 @@ std::string objectionTo(const AuditToken& peer, const std::optional<AuditToken>&
     return {};
 }
 
-ConnectedSocket connectToEndpoint(const IpcContext& context,
-                                  const std::shared_ptr<ListenerEndpoint>& endpoint)
+ConnectedSocket connectToEndpoint(IpcContext& context, const std::shared_ptr<ListenerEndpoint>& endpoint)
 {
     const auto role = endpointRole(context);
     const auto* file = dynamic_cast<const LinuxTransferredFile*>(endpoint.get());
@@ -50,7 +49,7 @@ ConnectedSocket connectToEndpoint(const IpcContext& context,
     }
     auto admission = context.accounting->admit(peer);
     if (!admission.refusal.empty()) {
-        TYLog_Error(context.log, admission.refusal);
+        context.offenders.report(peer, "connections", admission.refusal);
     }
     if (!admission.charge) {
         return {{}, {}, role, "its process has too many connections"};
@@ -83,6 +82,9 @@ std::shared_ptr<IpcContext> makeContext(EventPool& pool, WorkQueues& queues, Log
                        handshake,
                        queues.createSerialQueue("com.vorlan.typhond.deadlines"),
                        std::move(accounting),
+                       std::make_shared<HeldBytes>(limits.heldBytesPerProcess, limits.heldBytesPerUser),
+                       OffenderLog(log),
+                       IdleSocket(),
                        {},
                        {}});
 }

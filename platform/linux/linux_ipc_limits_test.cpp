@@ -6,6 +6,7 @@
 #include "testing/wire_message.h"
 
 #include <algorithm>
+#include <cstring>
 #include <thread>
 
 #include <fcntl.h>
@@ -30,7 +31,7 @@ TEST(LinuxIpcLimits, AHandshakeMustEndInTime)
     write(partial, std::string(1, '\0') + "AUTH EXTE");
     EXPECT_TRUE(isClosedByPeer(silent.get()));
     EXPECT_TRUE(isClosedByPeer(partial.get()));
-    EXPECT_TRUE(service.log.waitFor("did not finish the handshake in time", 2));
+    EXPECT_TRUE(service.log.waitFor("did not finish the handshake in time"));
     EXPECT_TRUE(finished.isAlive());
 }
 
@@ -70,17 +71,15 @@ TEST(LinuxIpcLimits, AMessageIsLimitedInSize)
     ForeignClient fits(service.path());
     EXPECT_EQ(fits.callText("echo", std::string(60U << 10, 'x')), "");
     EXPECT_NE(fits.callText("echo", std::string(80U << 10, 'x')), "");
-    // Once a message has begun where it could be seen, its beginning is enough.
+    // Its beginning is enough.
     const auto socket = rawConnection(service.path());
     const std::string small = "small";
     const std::string large(200U << 10, 'x');
     write(socket, pipelinedHandshake() + WireMessage::call(1, testedInterface, "note", &small));
     ASSERT_TRUE(service.log.waitFor("noted small"));
-    write(socket, WireMessage::call(2, testedInterface, "note", &small));
-    ASSERT_TRUE(service.log.waitFor("noted small", 2));
-    write(socket, WireMessage::call(3, testedInterface, "note", &large).substr(0, 16));
+    write(socket, WireMessage::call(2, testedInterface, "note", &large).substr(0, 16));
     EXPECT_TRUE(isClosedByPeer(socket.get()));
-    EXPECT_TRUE(service.log.waitFor("its message is too large"));
+    EXPECT_EQ(service.log.countContaining("its message is too large"), 1U);
 }
 
 /// Waits until the peer has read everything.
@@ -99,23 +98,150 @@ TEST(LinuxIpcLimits, ASplitMessageIsLimitedInSize)
     TestedService service(limits);
     const auto socket = rawConnection(service.path());
     const std::string large(200U << 10, 'x');
-    const std::string small = "small";
     const auto message = WireMessage::call(1, testedInterface, "note", &large);
     write(socket, pipelinedHandshake() + message.substr(0, 5));
     drain(socket);
     bool isRefused = false;
-    for (std::size_t offset = 5; offset < message.size() && !isRefused; offset += 4096) {
-        const auto part = std::string_view(message).substr(offset, 4096);
+    std::size_t sent = 5;
+    for (; sent < 64U << 10 && !isRefused; sent += 5) {
+        const auto part = std::string_view(message).substr(sent, 5);
         isRefused = ::send(socket.get(), part.data(), part.size(), MSG_NOSIGNAL) < 0;
         drain(socket);
     }
-    // Parts that come while others are being read are not counted; then the whole is refused.
-    if (!isRefused) {
-        const auto next = WireMessage::call(2, testedInterface, "note", &small);
-        isRefused = ::send(socket.get(), next.data(), next.size(), MSG_NOSIGNAL) < 0;
-    }
-    EXPECT_TRUE(isRefused ? isClosedByPeer(socket.get()) : service.log.waitFor("noted small"));
+    EXPECT_LE(sent, 32U) << "its header is enough";
+    EXPECT_TRUE(isClosedByPeer(socket.get()));
     EXPECT_EQ(service.log.countContaining("noted x"), 0U);
+}
+
+TEST(LinuxIpcLimits, MessagesInPiecesAreUnderstoodHoweverTheyAreCut)
+{
+    TestedService service;
+    const auto socket = rawConnection(service.path());
+    write(socket, pipelinedHandshake());
+    std::size_t noted = 0;
+    const std::string text = "pieces";
+    for (const std::size_t size : {1, 3, 15, 16, 17, 40}) {
+        const auto message =
+            WireMessage::call(static_cast<std::uint32_t>(++noted), testedInterface, "note", &text);
+        for (std::size_t at = 0; at < message.size(); at += size) {
+            write(socket, std::string_view(message).substr(at, size));
+            drain(socket);
+        }
+        ASSERT_TRUE(service.log.waitFor("noted pieces", noted)) << size;
+    }
+    // Large ones, and several at once.
+    const std::string large(300U << 10, 'x');
+    const auto many = WireMessage::call(20, testedInterface, "note", &large) +
+                      WireMessage::call(21, testedInterface, "note", &text) +
+                      WireMessage::call(22, testedInterface, "note", &large);
+    for (std::string_view rest = many; !rest.empty();) {
+        const auto sent = ::send(socket.get(), rest.data(), rest.size(), MSG_NOSIGNAL);
+        ASSERT_GT(sent, 0);
+        rest.remove_prefix(static_cast<std::size_t>(sent));
+    }
+    EXPECT_TRUE(service.log.waitFor("noted x", 2));
+    EXPECT_TRUE(service.log.waitFor("noted pieces", noted + 1));
+}
+
+/// Sends bytes together with so many descriptors.
+ssize_t sendWithDescriptors(int socket, std::string_view bytes, std::size_t count)
+{
+    const FileDescriptor file(::open("/dev/null", O_RDONLY | O_CLOEXEC));
+    iovec part{const_cast<char*>(bytes.data()), bytes.size()};
+    std::vector<char> control(CMSG_SPACE(count * sizeof(int)));
+    msghdr message{};
+    message.msg_iov = &part;
+    message.msg_iovlen = 1;
+    message.msg_control = control.data();
+    message.msg_controllen = control.size();
+    auto* rights = CMSG_FIRSTHDR(&message);
+    rights->cmsg_level = SOL_SOCKET;
+    rights->cmsg_type = SCM_RIGHTS;
+    rights->cmsg_len = CMSG_LEN(count * sizeof(int));
+    const std::vector<int> copies(count, file.get());
+    std::memcpy(CMSG_DATA(rights), copies.data(), count * sizeof(int));
+    return ::sendmsg(socket, &message, MSG_NOSIGNAL);
+}
+
+TEST(LinuxIpcLimits, DescriptorsOfHalfAMessageAreLimited)
+{
+    TestedService service;
+    const auto socket = rawConnection(service.path());
+    const std::string text = "never whole";
+    const auto message = WireMessage::call(1, testedInterface, "note", &text);
+    write(socket, pipelinedHandshake());
+    std::size_t sent = 0;
+    while (sent < message.size() - 1 &&
+           sendWithDescriptors(socket.get(), std::string_view(message).substr(sent, 1), 6) == 1) {
+        ++sent;
+        drain(socket);
+    }
+    EXPECT_LE(sent, 4U);
+    EXPECT_TRUE(isClosedByPeer(socket.get()));
+    EXPECT_EQ(service.log.countContaining("too many descriptors"), 1U);
+}
+
+TEST(LinuxIpcLimits, AFirstMessageMayCarryDescriptorsRightBehindTheHandshake)
+{
+    TestedService service;
+    const std::string text = "the first";
+    const auto message = WireMessage::call(1, testedInterface, "note", &text, 2);
+    for (std::size_t times = 1; times <= 50; ++times) {
+        const auto socket = rawConnection(service.path());
+        write(socket, pipelinedHandshake());
+        ASSERT_EQ(sendWithDescriptors(socket.get(), message, 2), static_cast<ssize_t>(message.size()));
+        ASSERT_TRUE(service.log.waitFor("noted the first", times));
+    }
+    // In pieces as well.
+    const auto socket = rawConnection(service.path());
+    write(socket, pipelinedHandshake());
+    ASSERT_EQ(sendWithDescriptors(socket.get(), message.substr(0, 20), 2), 20);
+    drain(socket);
+    write(socket, message.substr(20));
+    EXPECT_TRUE(service.log.waitFor("noted the first", 51));
+}
+
+TEST(LinuxIpcLimits, AMessageMustEndInTime)
+{
+    IpcLimits limits;
+    limits.wholeMessage = std::chrono::milliseconds(50);
+    TestedService service(limits);
+    ForeignClient other(service.path());
+    const std::string text = "never whole";
+    const auto message = WireMessage::call(1, testedInterface, "note", &text);
+    for (const std::size_t size : {std::size_t{1}, message.size() / 2, message.size() - 1}) {
+        const auto socket = rawConnection(service.path());
+        write(socket, pipelinedHandshake() + message.substr(0, size));
+        EXPECT_TRUE(isClosedByPeer(socket.get()));
+    }
+    EXPECT_EQ(service.log.countContaining("did not finish a message in time"), 1U);
+    EXPECT_TRUE(other.isAlive());
+}
+
+TEST(LinuxIpcLimits, WhatAProcessLeavesUnfinishedIsLimited)
+{
+    IpcLimits limits;
+    limits.heldBytesPerProcess = 256U << 10;
+    TestedService service(limits);
+    const std::string large(1U << 20, 'x');
+    const auto half = WireMessage::call(1, testedInterface, "note", &large).substr(0, 100U << 10);
+    std::vector<FileDescriptor> sockets;
+    for (int count = 0; count < 3; ++count) {
+        sockets.push_back(rawConnection(service.path()));
+        write(sockets.back(), pipelinedHandshake() + half);
+        drain(sockets.back());
+    }
+    EXPECT_TRUE(isClosedByPeer(sockets.back().get()));
+    EXPECT_EQ(service.log.countContaining("too many messages unfinished"), 1U);
+    // What was held is free again with the connections.
+    sockets.clear();
+    const auto next = rawConnection(service.path());
+    const std::string text = "whole";
+    const auto whole = WireMessage::call(1, testedInterface, "note", &text);
+    write(next, pipelinedHandshake() + whole.substr(0, 20));
+    drain(next);
+    write(next, whole.substr(20));
+    EXPECT_TRUE(service.log.waitFor("noted whole"));
 }
 
 TEST(LinuxIpcLimits, UnansweredCallsAreLimited)

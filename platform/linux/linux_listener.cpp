@@ -173,7 +173,7 @@ void LinuxListener::offer(FileDescriptor socket)
     const auto peer = context_->identifyPeer(socket.get());
     auto admission = context_->accounting->admit(peer);
     if (!admission.refusal.empty()) {
-        TYLog_Error(context_->log, admission.refusal);
+        context_->offenders.report(peer, "connections", admission.refusal);
     }
     std::shared_ptr<ListenerDelegate> delegate;
     {

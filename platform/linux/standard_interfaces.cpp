@@ -14,6 +14,7 @@ constexpr const char* unknownInterface = "org.freedesktop.DBus.Error.UnknownInte
 constexpr const char* unknownProperty = "org.freedesktop.DBus.Error.UnknownProperty";
 constexpr std::string_view busInterface = "org.freedesktop.DBus";
 constexpr std::string_view busPath = "/org/freedesktop/DBus";
+constexpr std::string_view peerInterface = "org.freedesktop.DBus.Peer";
 constexpr std::string_view introspectable = "org.freedesktop.DBus.Introspectable";
 constexpr std::string_view properties = "org.freedesktop.DBus.Properties";
 
@@ -85,6 +86,10 @@ std::optional<StandardAnswer> standardAnswer(const CallTarget& target, const std
     // There is no bus, but tools that are given an address (gdbus among them) take it for one and greet it.
     if (target.interface == busInterface && target.path == busPath && target.member == "Hello") {
         return StandardAnswer{"s", {Arguments{PropertyList(":1.1")}, {}}};
+    }
+    // sd-bus answers this itself, where it read the message.
+    if (target.interface == peerInterface && target.member == "Ping" && signature.empty()) {
+        return StandardAnswer{"", {Arguments{}, {}}};
     }
     if (target.interface == introspectable) {
         return introspect(target, signature, interfaces);

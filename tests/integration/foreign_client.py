@@ -25,9 +25,6 @@ class Client:
         self.connection = Gio.DBusConnection.new_sync(
             self._stream(f"{root}/run/typhon/{service}"), None,
             Gio.DBusConnectionFlags.AUTHENTICATION_CLIENT, None, None)
-        # Descriptors must not arrive together with the end of the handshake.
-        self.connection.call_sync(None, PATH, "org.freedesktop.DBus.Peer", "Ping", None, None,
-                                  Gio.DBusCallFlags.NONE, 60000, None)
 
     @staticmethod
     def _stream(path):

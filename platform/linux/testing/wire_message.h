@@ -12,11 +12,12 @@ inline std::string pipelinedHandshake()
     return std::string(1, '\0') + "AUTH EXTERNAL\r\nDATA\r\nNEGOTIATE_UNIX_FD\r\nBEGIN\r\n";
 }
 
-/// A method call with at most one string as its argument, byte for byte as it travels.
+/// A method call with at most one string as its argument, byte for byte as it travels. Descriptors may go with
+/// it, which it announces.
 class WireMessage {
 public:
     static std::string call(std::uint32_t serial, std::string_view interface, std::string_view member,
-                            const std::string* text = nullptr)
+                            const std::string* text = nullptr, std::uint32_t descriptors = 0)
     {
         std::string body;
         if (text != nullptr) {
@@ -29,6 +30,11 @@ public:
         if (text != nullptr) {
             pad(fields, 8);
             fields += std::string("\x08\x01g\0\x01s\0", 7);
+        }
+        if (descriptors > 0) {
+            pad(fields, 8);
+            fields += std::string("\x09\x01u\0", 4);
+            appendNumber(fields, descriptors);
         }
         std::string message("l\1\0\1", 4);
         appendNumber(message, static_cast<std::uint32_t>(body.size()));

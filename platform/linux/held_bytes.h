@@ -1,0 +1,85 @@
+#pragma once
+
+#include "platform/audit_token.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <utility>
+
+namespace typhon {
+
+/// Counts the memory that peers make this process hold for messages that are not whole yet. Any thread.
+class HeldBytes : public std::enable_shared_from_this<HeldBytes> {
+public:
+    HeldBytes(std::size_t perProcess, std::size_t perUser) : perProcess_(perProcess), perUser_(perUser) {}
+
+    /// What one connection holds; given back when it is destroyed.
+    class Claim {
+    public:
+        Claim(std::shared_ptr<HeldBytes> held, const AuditToken& peer) : held_(std::move(held)), peer_(peer)
+        {}
+        ~Claim() { release(); }
+        Claim(const Claim&) = delete;
+        Claim& operator=(const Claim&) = delete;
+
+        /// False when that is too much, and then nothing changes.
+        bool grow(std::size_t bytes)
+        {
+            const bool granted = held_->take(peer_, bytes);
+            bytes_ += granted ? bytes : 0;
+            return granted;
+        }
+        void release() { held_->give(peer_, std::exchange(bytes_, 0)); }
+
+    private:
+        const std::shared_ptr<HeldBytes> held_;
+        const AuditToken peer_;
+        std::size_t bytes_ = 0;
+    };
+
+private:
+    using ProcessKey = std::pair<std::int32_t, std::uint64_t>;
+    static ProcessKey keyOf(const AuditToken& peer) { return {peer.processIdentifier, peer.processInstance}; }
+
+    bool take(const AuditToken& peer, std::size_t bytes)
+    {
+        const std::lock_guard lock(mutex_);
+        auto& process = processes_[keyOf(peer)];
+        auto& user = users_[peer.effectiveUser];
+        const bool granted = process + bytes <= perProcess_ && user + bytes <= perUser_;
+        process += granted ? bytes : 0;
+        user += granted ? bytes : 0;
+        forgetEmpty(peer);
+        return granted;
+    }
+    void give(const AuditToken& peer, std::size_t bytes)
+    {
+        if (bytes == 0) {
+            return;
+        }
+        const std::lock_guard lock(mutex_);
+        processes_[keyOf(peer)] -= bytes;
+        users_[peer.effectiveUser] -= bytes;
+        forgetEmpty(peer);
+    }
+    void forgetEmpty(const AuditToken& peer)
+    {
+        if (processes_[keyOf(peer)] == 0) {
+            processes_.erase(keyOf(peer));
+        }
+        if (users_[peer.effectiveUser] == 0) {
+            users_.erase(peer.effectiveUser);
+        }
+    }
+
+    const std::size_t perProcess_;
+    const std::size_t perUser_;
+    std::mutex mutex_;
+    std::map<ProcessKey, std::size_t> processes_;
+    std::map<std::uint32_t, std::size_t> users_;
+};
+
+}  // namespace typhon

@@ -1,0 +1,186 @@
+#include "platform/linux/message_reception.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <span>
+#include <utility>
+
+#include <sys/socket.h>
+
+namespace typhon {
+
+namespace {
+
+constexpr std::size_t headerSize = 16;
+/// What is looked at first; most messages are smaller.
+constexpr std::size_t smallLook = 4U << 10;
+/// Messages up to this size are read by sd-bus itself.
+constexpr std::size_t largeLook = 64U << 10;
+/// The kernel passes no more at once.
+constexpr std::size_t maximumDescriptors = 253;
+
+using Bytes = std::span<const std::uint8_t>;
+
+std::uint32_t number(Bytes header, std::size_t offset)
+{
+    const bool little = header[0] == 'l';
+    std::uint32_t result = 0;
+    for (std::size_t index = 0; index < 4; ++index) {
+        result |= std::uint32_t{header[offset + index]} << (8 * (little ? index : 3 - index));
+    }
+    return result;
+}
+
+bool isWellFormed(Bytes header)
+{
+    return (header[0] == 'l' || header[0] == 'B') && header[3] == 1;
+}
+
+/// Fixed header, padded header fields, body.
+std::uint64_t messageSize(Bytes header)
+{
+    const std::uint64_t fields = number(header, 12);
+    return headerSize + (fields + 7) / 8 * 8 + number(header, 4);
+}
+
+/// Where messages are looked at. Nothing of it is used later.
+std::span<std::uint8_t> scratch()
+{
+    thread_local std::vector<std::uint8_t> bytes(largeLook);
+    return bytes;
+}
+
+/// Without room for descriptors: those stay with the message. It ends behind the first bytes that come with
+/// some.
+ssize_t peek(int socket, std::size_t size)
+{
+    return ::recv(socket, scratch().data(), size, MSG_PEEK | MSG_DONTWAIT);
+}
+
+bool isTransient(int error)
+{
+    return error == EAGAIN || error == EINTR;
+}
+
+}  // namespace
+
+MessageReception::Outcome MessageReception::next(int socket)
+{
+    if (!begun_) {
+        const auto outcome = look(socket);
+        if (outcome != Outcome::begun) {
+            return outcome;
+        }
+        begun_ = true;
+    }
+    return assemble(socket);
+}
+
+MessageReception::Outcome MessageReception::look(int socket)
+{
+    auto waiting = peek(socket, smallLook);
+    if (waiting <= 0) {
+        return waiting < 0 && isTransient(errno) ? Outcome::nothing : Outcome::closed;
+    }
+    if (static_cast<std::size_t>(waiting) < headerSize) {
+        return Outcome::begun;
+    }
+    const Bytes header = scratch().first(headerSize);
+    const auto size = messageSize(header);
+    if (!isWellFormed(header)) {
+        return Outcome::malformed;
+    }
+    if (size > limits_.bytes) {
+        return Outcome::tooLarge;
+    }
+    if (static_cast<std::size_t>(waiting) < size && size <= largeLook) {
+        waiting = peek(socket, size);
+    }
+    return std::cmp_greater_equal(waiting, size) ? Outcome::ready : Outcome::begun;
+}
+
+MessageReception::Outcome MessageReception::assemble(int socket)
+{
+    for (;;) {
+        auto outcome = readMore(socket);
+        if (outcome != Outcome::ready) {
+            return outcome;
+        }
+        outcome = checkSize();
+        if (outcome != Outcome::begun) {
+            return outcome;
+        }
+    }
+}
+
+/// After more bytes have come.
+MessageReception::Outcome MessageReception::checkSize()
+{
+    if (size_ == 0 && message_.bytes.size() >= headerSize) {
+        if (!isWellFormed(message_.bytes)) {
+            return Outcome::malformed;
+        }
+        size_ = messageSize(message_.bytes);
+        if (size_ > limits_.bytes) {
+            return Outcome::tooLarge;
+        }
+    }
+    return size_ > 0 && message_.bytes.size() == size_ ? Outcome::assembled : Outcome::begun;
+}
+
+/// Reads once, never beyond the message's end. `ready` when something has come.
+MessageReception::Outcome MessageReception::readMore(int socket)
+{
+    auto& bytes = message_.bytes;
+    const auto missing = (size_ > 0 ? static_cast<std::size_t>(size_) : headerSize) - bytes.size();
+    const auto room = scratch().first(std::min(missing, largeLook));
+    iovec part{room.data(), room.size()};
+    alignas(cmsghdr) std::array<char, CMSG_SPACE(maximumDescriptors * sizeof(int))> control;
+    msghdr message{};
+    message.msg_iov = &part;
+    message.msg_iovlen = 1;
+    message.msg_control = control.data();
+    message.msg_controllen = control.size();
+    const auto got = ::recvmsg(socket, &message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
+    if (got <= 0) {
+        return got < 0 && isTransient(errno) ? Outcome::begun : Outcome::closed;
+    }
+    if (!keepDescriptors(message)) {
+        return Outcome::tooManyDescriptors;
+    }
+    if (!held_->grow(static_cast<std::size_t>(got))) {
+        return Outcome::tooMuchHeld;
+    }
+    bytes.insert(bytes.end(), room.begin(), room.begin() + got);
+    return Outcome::ready;
+}
+
+bool MessageReception::keepDescriptors(msghdr& message)
+{
+    for (auto* part = CMSG_FIRSTHDR(&message); part != nullptr; part = CMSG_NXTHDR(&message, part)) {
+        if (part->cmsg_level != SOL_SOCKET || part->cmsg_type != SCM_RIGHTS) {
+            continue;
+        }
+        const auto count = (part->cmsg_len - CMSG_LEN(0)) / sizeof(int);
+        for (std::size_t index = 0; index < count; ++index) {
+            int descriptor = -1;
+            std::memcpy(&descriptor, CMSG_DATA(part) + index * sizeof(int), sizeof descriptor);
+            message_.descriptors.emplace_back(descriptor);
+        }
+    }
+    // Truncated: there was no room for more descriptors in the process.
+    const auto limit = descriptorsAllowed_ ? limits_.descriptors : 0;
+    return message_.descriptors.size() <= limit && (message.msg_flags & MSG_CTRUNC) == 0;
+}
+
+ReceivedMessage MessageReception::take()
+{
+    begun_ = false;
+    size_ = 0;
+    held_->release();
+    return std::exchange(message_, {});
+}
+
+}  // namespace typhon
