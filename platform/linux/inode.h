@@ -14,6 +14,7 @@ namespace typhon {
 struct Inode {
     std::uint64_t device = 0;
     std::uint64_t number = 0;
+    // NOLINTNEXTLINE(modernize-use-nullptr): it misreads the comparison
     auto operator<=>(const Inode&) const = default;
 };
 

@@ -25,6 +25,7 @@ struct FileIdentity {
 
     FileIdentity() = default;
     explicit FileIdentity(const struct stat& status);
+    // NOLINTNEXTLINE(modernize-use-nullptr): it misreads the comparison
     auto operator<=>(const FileIdentity&) const = default;
 
     /// True when every change from now on will show: the file's last change is earlier than the kernel's

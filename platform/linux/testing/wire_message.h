@@ -12,8 +12,8 @@ inline std::string pipelinedHandshake()
     return std::string(1, '\0') + "AUTH EXTERNAL\r\nDATA\r\nNEGOTIATE_UNIX_FD\r\nBEGIN\r\n";
 }
 
-/// A method call with at most one string as its argument, byte for byte as it travels. Descriptors may go with
-/// it, which it announces.
+/// A method call with at most one string as its argument, byte for byte as it travels. Descriptors may go
+/// with it, which it announces.
 class WireMessage {
 public:
     static std::string call(std::uint32_t serial, std::string_view interface, std::string_view member,
