@@ -78,8 +78,13 @@ TEST_F(HostileFontTest, AFontThatHangsDoesNotHoldUpOthers)
     EXPECT_EQ(hanging.error, "takes more than 1 s to read");
 }
 
-// The sanitizers' books do not fit into any limit of memory.
+// The sanitizers handle faults themselves, and their books do not fit into any limit of memory.
 #if !defined(__SANITIZE_ADDRESS__) && !defined(__SANITIZE_THREAD__)
+TEST_F(HostileFontTest, TheErrorOfACrashNamesItsSignal)
+{
+    EXPECT_EQ(read("crash").error, "crashes the font reader (Segmentation fault)");
+}
+
 TEST_F(HostileFontTest, AFontThatEatsMemoryIsRefused)
 {
     EXPECT_EQ(read("eat").error, "takes more than 256 MiB of memory to read");
