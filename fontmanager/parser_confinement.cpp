@@ -111,11 +111,11 @@ void allowSanitizers(SyscallFilter& filter)
         return;
     }
     constexpr uint32_t thread = CLONE_VM | CLONE_FS | CLONE_FILES | CLONE_SIGHAND | CLONE_THREAD;
-    filter.allow(SYS_clone, {{0, Kind::hasAll, thread}});
+    filter.allow(SYS_clone, {{0, Kind::hasAll, thread}}).allow(SYS_mprotect, {{2, Kind::hasNone, PROT_EXEC}});
     for (const long call :
-         {SYS_mprotect, SYS_futex, SYS_sched_yield, SYS_sigaltstack, SYS_rt_sigprocmask, SYS_rt_sigaction,
-          SYS_gettid, SYS_getpid, SYS_getrlimit, SYS_clock_nanosleep, SYS_nanosleep, SYS_set_robust_list,
-          SYS_rseq, SYS_sched_getaffinity, SYS_rt_sigreturn, SYS_exit, SYS_prctl}) {
+         {SYS_futex, SYS_sched_yield, SYS_sigaltstack, SYS_rt_sigprocmask, SYS_rt_sigaction, SYS_gettid,
+          SYS_getpid, SYS_getrlimit, SYS_clock_nanosleep, SYS_nanosleep, SYS_set_robust_list, SYS_rseq,
+          SYS_sched_getaffinity, SYS_rt_sigreturn, SYS_exit, SYS_prctl}) {
         filter.allow(call);
     }
 }
