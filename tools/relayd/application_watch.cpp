@@ -63,7 +63,10 @@ void ApplicationWatch::look()
 {
     for (int round = 0; round < mostRounds && watchEverything(); ++round) {
     }
-    auto removed = tracker_.saw(installed(), std::chrono::steady_clock::now());
+    auto present = installed();
+    logChanges(present);
+    auto removed = tracker_.saw(present, std::chrono::steady_clock::now());
+    installed_ = std::move(present);
     if (!removed.empty()) {
         for (const auto& identifier : removed) {
             TYLog(services_.log, "application \"" + identifier + "\" was removed");
@@ -187,6 +190,20 @@ std::set<std::string> ApplicationWatch::installed()
         all.insert(source.identifiers.begin(), source.identifiers.end());
     }
     return all;
+}
+
+void ApplicationWatch::logChanges(const std::set<std::string>& installed)
+{
+    const auto log = [this](const std::set<std::string>& some, const std::set<std::string>& others,
+                            const char* what) {
+        for (const auto& identifier : some) {
+            if (!others.contains(identifier)) {
+                TYLog_Debug(services_.log, "application \"" + identifier + "\" " + what);
+            }
+        }
+    };
+    log(installed, installed_, "is installed");
+    log(installed_, installed, "is not installed any more");
 }
 
 void ApplicationWatch::planNextLook()

@@ -54,6 +54,7 @@ private:
     void watchEntries(const Source& source);
     void watch(const std::string& path, const FileDescriptor& directory, const std::string& onlyName = {});
     std::set<std::string> installed();
+    void logChanges(const std::set<std::string>& installed);
     void planNextLook();
 
     const Services services_;
@@ -67,6 +68,7 @@ private:
     RemovalTracker tracker_;
     /// By the data directory's path.
     std::map<std::string, Source> sources_;
+    std::set<std::string> installed_;
     std::set<std::string> watched_;
     bool foundNew_ = false;
     bool isBlind_ = false;

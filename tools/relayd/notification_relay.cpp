@@ -18,7 +18,6 @@ namespace typhon {
 
 namespace {
 
-constexpr double postsASecond = 1000;
 /// Posts whose sender is being asked for.
 constexpr std::size_t mostUndecided = 256;
 /// Notifications of this process's own that wait for the bus.
@@ -55,7 +54,8 @@ std::string complaintAbout(const std::optional<Arguments>& notification)
 
 }  // namespace
 
-AnnouncingService::AnnouncingService(const NotificationService& service, TrustsUser mayPost, Log& log)
+AnnouncingService::AnnouncingService(const NotificationService& service, TrustsUser mayPost, Log& log,
+                                     double postsASecond)
     : service_(service), mayPost_(std::move(mayPost)), log_(log), rate_(postsASecond), refusalsLogged_(1)
 {}
 
@@ -217,9 +217,9 @@ std::optional<IpcError> AnnouncingService::emit(const Arguments& notification)
     return result >= 0 ? std::nullopt : std::optional(IpcError{ipc_errors::failed, errorText(result)});
 }
 
-NotificationRelay::NotificationRelay(const TrustsUser& mayPost, Log& log)
-    : ping_(std::make_shared<AnnouncingService>(pingService, mayPost, log)),
-      relay_(std::make_shared<AnnouncingService>(relayService, mayPost, log))
+NotificationRelay::NotificationRelay(const TrustsUser& mayPost, Log& log, double postsASecond)
+    : ping_(std::make_shared<AnnouncingService>(pingService, mayPost, log, postsASecond)),
+      relay_(std::make_shared<AnnouncingService>(relayService, mayPost, log, postsASecond))
 {}
 
 void NotificationRelay::busConnected(sd_bus* bus)

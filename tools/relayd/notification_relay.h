@@ -24,7 +24,7 @@ namespace typhon {
 /// shared pointer. On the bus's queue only.
 class AnnouncingService : public std::enable_shared_from_this<AnnouncingService> {
 public:
-    AnnouncingService(const NotificationService& service, TrustsUser mayPost, Log& log);
+    AnnouncingService(const NotificationService& service, TrustsUser mayPost, Log& log, double postsASecond);
 
     void connected(sd_bus* bus);
     void lost();
@@ -67,7 +67,7 @@ private:
 /// The relay on one connection: both services.
 class NotificationRelay final : public SystemBusUser {
 public:
-    NotificationRelay(const TrustsUser& mayPost, Log& log);
+    NotificationRelay(const TrustsUser& mayPost, Log& log, double postsASecond = 1000);
 
     void busConnected(sd_bus* bus) override;
     void busLost() override;
