@@ -297,16 +297,25 @@ std::optional<std::string> FontStore::place(const PendingChange& change)
 
 void FontStore::removeFiles(const std::vector<std::string>& paths)
 {
+    std::map<std::string, std::unique_ptr<ProviderDirectories::Lease>> leases;
     for (const auto& path : paths) {
         const auto place = font_paths::placeOfFontFile(path);
-        const auto opening =
-            place ? directories_.open(place->directory, false) : ProviderDirectories::Opening{};
-        if (!opening.lease) {
+        if (!place) {
             continue;
         }
-        if (::unlinkat(opening.lease->descriptor(), place->name.c_str(), 0) != 0 && errno != ENOENT) {
+        auto& lease = leases[place->directory];
+        if (!lease) {
+            lease = directories_.open(place->directory, false).lease;
+        }
+        if (lease && ::unlinkat(lease->descriptor(), place->name.c_str(), 0) != 0 && errno != ENOENT) {
             const int error = errno;
             TYLog_Error(log_, "cannot remove " + visibleText(path) + ": " + errorText(error));
+        }
+    }
+    for (const auto& [name, lease] : leases) {
+        const auto error = lease ? flushOpenDirectory(lease->descriptor(), name) : std::nullopt;
+        if (error) {
+            TYLog_Error(log_, *error);
         }
     }
 }
@@ -335,6 +344,13 @@ void FontStore::dropLostPlacements(PendingChange& change)
 
 void FontStore::sweepCopies()
 {
+    // What comes of a registry or journal that was not written to its end; the next one would replace it too.
+    const FileLock registryLock(root_.real(font_paths::registry) + ".lock");
+    for (const char* path : {font_paths::registry, font_paths::journal}) {
+        if (!registryLock.error()) {
+            ::unlink((root_.real(path) + ".new").c_str());
+        }
+    }
     for (const auto& name : directories_.names()) {
         const auto opening = directories_.open(name, false);
         if (!opening.lease) {
