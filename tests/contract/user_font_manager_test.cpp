@@ -1,5 +1,10 @@
+#include "fontmanager/daemon/service_fixture.h"
+#include "fontmanager/font_names.h"
+#include "fontmanager/font_paths.h"
 #include "fontmanager/linux_user_font_manager.h"
+#include "platform/file_url.h"
 #include "platform/linux/linux_log.h"
+#include "platform/linux/property_list_writer.h"
 #include "platform/linux/scratch_directory.h"
 #include "platform/simulated/simulated_user_font_manager.h"
 
@@ -23,12 +28,21 @@ public:
     virtual ~Subject() = default;
     virtual TYUserFontManager& manager() = 0;
     virtual void finishSynchronizations() = 0;
+    /// Makes the registry this, with a file for each of its paths.
+    virtual void writeRegistry(PropertyList::Dictionary entries) = 0;
+    /// Lets operations that were started go on.
+    virtual void proceed() = 0;
 };
 
 class SimulatedSubject final : public Subject {
 public:
     TYUserFontManager& manager() override { return manager_; }
     void finishSynchronizations() override { manager_.finishProfileSynchronizations(); }
+    void writeRegistry(PropertyList::Dictionary entries) override
+    {
+        fileSystem_.addFile(font_paths::registry, std::move(entries));
+    }
+    void proceed() override { scheduler_.runUntilIdle(); }
 
 private:
     SimulatedScheduler scheduler_{1};
@@ -36,15 +50,25 @@ private:
     SimulatedUserFontManager manager_{scheduler_, fileSystem_};
 };
 
+/// The library and its helper's service, which takes the library for an administrator.
 class LinuxSubject final : public Subject {
 public:
     TYUserFontManager& manager() override { return manager_; }
     void finishSynchronizations() override {}
+    void writeRegistry(PropertyList::Dictionary entries) override
+    {
+        for (const auto& [path, entry] : entries) {
+            scratch_.writeFile(path, "font");
+        }
+        scratch_.writeFile(font_paths::registry, writeXmlPropertyList(std::move(entries)));
+    }
+    void proceed() override {}
 
 private:
     ScratchDirectory scratch_;
     LinuxLog log_{LogLevel::error};
-    /// No program of that name: the helper is not there.
+    test_service::RunningService helper_{RootDirectory(scratch_.path()),
+                                         [](int file) { return readFontNames(file); }};
     LinuxUserFontManager manager_{RootDirectory(scratch_.path()), log_, scratch_.real("/no-helper")};
 };
 
@@ -137,9 +161,137 @@ TEST_P(UserFontManagerContract, EverySynchronizationCompletesInOrder)
     EXPECT_EQ(order, (std::vector<int>{0, 1, 2, 3, 4}));
 }
 
-INSTANTIATE_TEST_SUITE_P(, UserFontManagerContract,
-                         testing::Values(Implementation{"Simulated", std::make_unique<SimulatedSubject>},
-                                         Implementation{"Linux", std::make_unique<LinuxSubject>}),
+constexpr const char* fontOfA = "/var/mobile/Library/UserFonts/FontFiles/org.example.a/x.ttf";
+constexpr const char* otherFontOfA = "/var/mobile/Library/UserFonts/FontFiles/org.example.a/y%z.ttf";
+constexpr const char* fontOfB = "/var/mobile/Library/UserFonts/FontFiles/b%2Fc/x.ttf";
+
+class UserFontManagerChanges : public UserFontManagerContract {
+protected:
+    UserFontManagerChanges()
+    {
+        subject->writeRegistry(
+            {{fontOfB, entry(false)}, {fontOfA, entry(false)}, {otherFontOfA, entry(true)}});
+    }
+    static PropertyList entry(bool disabled)
+    {
+        return PropertyList::Dictionary{
+            {"familyName", PropertyList::Dictionary{{"X", "X"}}}, {"disabled", disabled}, {"colour", "blue"}};
+    }
+    FontManagerError enableOrDisable(std::vector<std::string> urls, bool enabled)
+    {
+        return completed([&](auto completion) {
+            subject->manager().enableOrDisablePersistentURLs(std::move(urls), enabled, std::move(completion));
+        });
+    }
+    FontManagerError unregister(const std::string& identifier)
+    {
+        return completed([&](auto completion) {
+            subject->manager().unregisterAndRemoveFontFilesForIdentifier(identifier, std::move(completion));
+        });
+    }
+    bool isDisabled(const char* path)
+    {
+        return subject->manager().userFontsInfo().find(path)->find("disabled")->isTrue();
+    }
+
+private:
+    FontManagerError completed(const std::function<void(std::function<void(FontManagerError)>)>& start)
+    {
+        std::promise<FontManagerError> promise;
+        // A second completion would throw.
+        start([&](FontManagerError error) { promise.set_value(std::move(error)); });
+        subject->proceed();
+        auto outcome = promise.get_future();
+        const bool isThere = outcome.wait_for(30s) == std::future_status::ready;
+        EXPECT_TRUE(isThere);
+        return isThere ? outcome.get() : FontManagerError("no completion");
+    }
+};
+
+TEST_P(UserFontManagerContract, WithoutARegistryThereAreNoFontsAndNoProviders)
+{
+    EXPECT_EQ(subject->manager().userFontsInfo(), PropertyList());
+    EXPECT_EQ(subject->manager().profileFontsInfo(), PropertyList());
+    EXPECT_TRUE(subject->manager().knownFontProviders().empty());
+}
+
+TEST_P(UserFontManagerChanges, ProvidersAreKnownByTheirDirectoriesEachOnceAndSorted)
+{
+    EXPECT_EQ(subject->manager().knownFontProviders(), (std::vector<std::string>{"b/c", "org.example.a"}));
+}
+
+TEST_P(UserFontManagerChanges, FontsAreSwitchedOnAndOffByTheirUrls)
+{
+    EXPECT_EQ(enableOrDisable({fileUrlFromPath(fontOfA), fileUrlFromPath(fontOfB)}, false), std::nullopt);
+    EXPECT_TRUE(isDisabled(fontOfA));
+    EXPECT_TRUE(isDisabled(fontOfB));
+    EXPECT_EQ(enableOrDisable({fileUrlFromPath(otherFontOfA)}, true), std::nullopt);
+    EXPECT_FALSE(isDisabled(otherFontOfA));
+    EXPECT_EQ(*subject->manager().userFontsInfo().find(otherFontOfA), entry(false));
+}
+
+TEST_P(UserFontManagerChanges, SwitchingIsAllOrNone)
+{
+    const auto before = subject->manager().userFontsInfo();
+    const auto stranger = fileUrlFromPath("/var/mobile/Library/UserFonts/FontFiles/org.example.a/none.ttf");
+    EXPECT_NE(enableOrDisable({fileUrlFromPath(fontOfA), stranger}, false), std::nullopt);
+    EXPECT_NE(enableOrDisable({fileUrlFromPath(fontOfA), "no URL"}, false), std::nullopt);
+    EXPECT_EQ(subject->manager().userFontsInfo(), before);
+}
+
+TEST_P(UserFontManagerChanges, UnregisteringAProviderLeavesTheOthers)
+{
+    EXPECT_EQ(unregister("org.example.a"), std::nullopt);
+    EXPECT_EQ(subject->manager().knownFontProviders(), std::vector<std::string>{"b/c"});
+    EXPECT_EQ(unregister("b/c"), std::nullopt);
+    EXPECT_EQ(subject->manager().userFontsInfo(), PropertyList());
+}
+
+TEST_P(UserFontManagerChanges, UnregisteringWhoHasNoFontsIsNoError)
+{
+    const auto before = subject->manager().userFontsInfo();
+    EXPECT_EQ(unregister("org.example.none"), std::nullopt);
+    EXPECT_EQ(unregister(std::string(300, 'a')), std::nullopt);
+    EXPECT_EQ(subject->manager().userFontsInfo(), before);
+}
+
+TEST_P(UserFontManagerChanges, ACompletionMayBeLeftOut)
+{
+    subject->manager().enableOrDisablePersistentURLs({fileUrlFromPath(fontOfA)}, false, {});
+    subject->manager().unregisterAndRemoveFontFilesForIdentifier("b/c", {});
+    subject->manager().synchronizeFontProviders();
+    // Comes after those.
+    EXPECT_EQ(enableOrDisable({fileUrlFromPath(otherFontOfA)}, true), std::nullopt);
+    EXPECT_TRUE(isDisabled(fontOfA));
+    EXPECT_EQ(subject->manager().userFontsInfo().find(fontOfB), nullptr);
+}
+
+TEST(LinuxUserFontManagerTest, WithoutTheHelperOperationsEndWithAnError)
+{
+    const ScratchDirectory scratch;
+    LinuxLog log{LogLevel::error, LinuxLog::Destination::descriptor, -1};
+    std::vector<FontManagerError> errors;
+    bool isSynchronized = false;
+    {
+        LinuxUserFontManager manager(RootDirectory(scratch.path()), log, scratch.real("/no-helper"));
+        const auto keep = [&](FontManagerError error) { errors.push_back(std::move(error)); };
+        manager.enableOrDisablePersistentURLs({fileUrlFromPath(fontOfA)}, true, keep);
+        manager.unregisterAndRemoveFontFilesForIdentifier("org.example.a", keep);
+        manager.synchronizeProfileFonts([&] { isSynchronized = true; });
+    }
+    ASSERT_EQ(errors.size(), 2u);
+    for (const auto& error : errors) {
+        EXPECT_NE(error.value_or("").find("does not run"), std::string::npos);
+    }
+    EXPECT_TRUE(isSynchronized);
+}
+
+const auto implementations = testing::Values(Implementation{"Simulated", std::make_unique<SimulatedSubject>},
+                                             Implementation{"Linux", std::make_unique<LinuxSubject>});
+
+INSTANTIATE_TEST_SUITE_P(, UserFontManagerChanges, implementations,
+                         [](const auto& implementation) { return implementation.param.name; });
+INSTANTIATE_TEST_SUITE_P(, UserFontManagerContract, implementations,
                          [](const auto& implementation) { return implementation.param.name; });
 
 }  // namespace

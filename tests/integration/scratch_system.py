@@ -1,6 +1,7 @@
 """A whole typhond system in a scratch folder: keys, signatures, fonts, preferences and the running daemon."""
 
 import contextlib
+import ctypes
 import json
 import os
 import pathlib
@@ -25,6 +26,11 @@ SERVICE = "com.vorlan.typhond"
 HELPER_SERVICE = "com.vorlan.Typhon.UserFontManager"
 HELPER_PID = "/run/typhon/typhon-fontmanagerd.pid"
 PATIENCE = 60
+
+
+# The helper is nobody's child; so it becomes ours when it ends, to be waited for.
+PR_SET_CHILD_SUBREAPER = 36
+ctypes.CDLL(None).prctl(PR_SET_CHILD_SUBREAPER, 1, 0, 0, 0)
 
 
 class Daemon:
@@ -226,6 +232,8 @@ class ScratchSystem:
             signal.pidfd_send_signal(pidfd, signal.SIGKILL)
             select.select([pidfd], [], [], PATIENCE)
             os.close(pidfd)
+            with contextlib.suppress(ChildProcessError):
+                os.waitpid(pid, 0)
             self.real(HELPER_PID).unlink(missing_ok=True)
 
     def restart(self, *arguments):
