@@ -1,5 +1,6 @@
 #include "fontmanager/font_paths.h"
 
+#include "fontmanager/directory_names.h"
 #include "platform/linux/visible_text.h"
 
 #include <algorithm>
@@ -24,6 +25,12 @@ char lowerCase(char c)
 }
 
 }  // namespace
+
+std::optional<std::string> fontDirectoryOfProvider(std::string_view identifier)
+{
+    const auto name = directoryNameFromIdentifier(identifier);
+    return name ? std::optional(fontFiles + *name) : std::nullopt;
+}
 
 std::optional<FontFilePlace> placeOfFontFile(std::string_view path)
 {

@@ -21,6 +21,9 @@ inline constexpr const char* managedFonts = "/var/mobile/Library/Fonts/Managed/"
 /// The record of those fonts, in the form of the registry.
 inline constexpr const char* profileFonts = "/var/mobile/Library/UserFonts/ProfileFonts.plist";
 
+/// The logical path of the directory of an application's font files, or null for an identifier without one.
+std::optional<std::string> fontDirectoryOfProvider(std::string_view identifier);
+
 /// A font file's place in the directories of the providers.
 struct FontFilePlace {
     std::string directory;

@@ -2,7 +2,6 @@
 
 #include "fontmanager/font_paths.h"
 #include "fontmanager/font_registry_client.h"
-#include "fontmanager/install_fonts.h"
 #include "fontmanager/profile_fonts.h"
 #include "platform/file_url.h"
 #include "tools/font_table.h"
@@ -83,7 +82,7 @@ std::optional<std::string> urlOf(const Invocation& invocation, const std::string
         return font;
     }
     if (font.find('/') == std::string::npos) {
-        const auto directory = fontDirectoryOfProvider(identifier);
+        const auto directory = font_paths::fontDirectoryOfProvider(identifier);
         return directory ? std::optional(fileUrlFromPath(*directory + "/" + font)) : std::nullopt;
     }
     auto path = std::filesystem::absolute(font).lexically_normal().string();
