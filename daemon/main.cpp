@@ -24,6 +24,8 @@
 #include "platform/linux/process_limits.h"
 #include "platform/linux/sandbox_instances.h"
 #include "platform/linux/sandboxes_service.h"
+#include "platform/linux/session_agent_service.h"
+#include "platform/linux/session_agents.h"
 #include "platform/linux/signature_store.h"
 
 #include <filesystem>
@@ -31,6 +33,7 @@
 #include <string>
 
 #include <CLI/CLI.hpp>
+#include <unistd.h>
 
 // The composition root: the one place that knows the services of Linux. It builds them, hands them to the
 // daemon as a `Platform`, opens the services beside the daemon's own, and gives the main thread away.
@@ -61,9 +64,7 @@ struct LinuxServices {
     LinuxFileSystem fileSystem{root};
     LinuxApplicationRegistry applicationRegistry{root, log};
     LinuxUserFontManager userFontManager{root, log};
-    LinuxProcessLifecycle processLifecycle;
-    LinuxRemoteAlerts remoteAlerts{log};
-    LinuxAnalytics analytics;
+    LinuxAnalytics analytics{root, log};
     LinuxNotifications notifications{pool, queues, log, root};
 
     ConfinementProbe probe;
@@ -72,6 +73,9 @@ struct LinuxServices {
     LinuxCodeSigning codeSigning{probe, sandboxInstances, signatures};
     ExtensionTokens tokens;
     LinuxSandbox sandbox{probe, tokens, root};
+    SessionAgents sessionAgents{codeSigning, sandbox, log, ::geteuid()};
+    LinuxProcessLifecycle processLifecycle{sessionAgents, probe};
+    LinuxRemoteAlerts remoteAlerts{sessionAgents};
     LinuxIpc ipc;
 };
 
@@ -129,6 +133,8 @@ void run(const Options& options)
     const auto brokerListener = startFileAccessService(services.ipc, broker);
     const auto sandboxesListener = startSandboxesService(services.ipc, sandboxes);
     const auto identitiesListener = startIdentitiesService(services.ipc, identities);
+    const auto agents = std::make_shared<SessionAgentService>(services.sessionAgents);
+    const auto agentsListener = startSessionAgentService(services.ipc, agents);
 
     services.notifications.start();
 

@@ -8,27 +8,31 @@ namespace {
 
 class LinuxRemoteAlertHandle final : public HWSRemoteAlertHandle {
 public:
-    LinuxRemoteAlertHandle(Log& log, HWSRemoteAlertDefinition definition)
-        : log_(log), definition_(std::move(definition))
+    LinuxRemoteAlertHandle(SessionAgents& agents, HWSRemoteAlertDefinition definition,
+                           std::shared_ptr<ListenerEndpoint> endpoint)
+        : agents_(agents), definition_(std::move(definition)), endpoint_(std::move(endpoint))
     {}
 
-    void activateWithContext(HWSRemoteAlertActivationContext /*context*/) override
+    void activateWithContext(HWSRemoteAlertActivationContext context) override
     {
-        TYLog_Error(log_, "an alert of " + definition_.serviceName + " cannot appear: there is no agent");
+        agents_.show({definition_.serviceName, definition_.viewControllerClassName,
+                      std::move(context.userInfo), endpoint_});
     }
 
 private:
-    Log& log_;
+    SessionAgents& agents_;
     const HWSRemoteAlertDefinition definition_;
+    const std::shared_ptr<ListenerEndpoint> endpoint_;
 };
 
 }  // namespace
 
 std::shared_ptr<HWSRemoteAlertHandle>
 LinuxRemoteAlerts::newHandle(HWSRemoteAlertDefinition withDefinition,
-                             HWSRemoteAlertConfigurationContext /*configurationContext*/)
+                             HWSRemoteAlertConfigurationContext configurationContext)
 {
-    return std::make_shared<LinuxRemoteAlertHandle>(log_, std::move(withDefinition));
+    return std::make_shared<LinuxRemoteAlertHandle>(agents_, std::move(withDefinition),
+                                                    std::move(configurationContext.endpoint));
 }
 
 }  // namespace typhon

@@ -1,24 +1,24 @@
 #pragma once
 
-#include "platform/log.h"
+#include "platform/linux/session_agents.h"
 #include "platform/remote_alert.h"
 
 namespace typhon {
 
-/// Remote alerts on Linux. Without a session agent the definition class is not available, and an alert fails
-/// to appear. Any thread.
+/// Remote alerts on Linux: the session agent shows them. Without one the definition class is not available.
+/// Any thread.
 class LinuxRemoteAlerts final : public RemoteAlerts {
 public:
-    /// `log` outlives this and every handle.
-    explicit LinuxRemoteAlerts(Log& log) : log_(log) {}
+    /// `agents` outlives this and every handle.
+    explicit LinuxRemoteAlerts(SessionAgents& agents) : agents_(agents) {}
 
-    bool isDefinitionClassAvailable() override { return false; }
+    bool isDefinitionClassAvailable() override { return agents_.isPresent(); }
     std::shared_ptr<HWSRemoteAlertHandle>
     newHandle(HWSRemoteAlertDefinition withDefinition,
               HWSRemoteAlertConfigurationContext configurationContext) override;
 
 private:
-    Log& log_;
+    SessionAgents& agents_;
 };
 
 }  // namespace typhon

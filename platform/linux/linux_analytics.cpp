@@ -1,0 +1,101 @@
+#include "platform/linux/linux_analytics.h"
+
+#include "platform/linux/file_descriptor.h"
+#include "platform/linux/journal_event.h"
+
+#include <cstddef>
+#include <cstring>
+#include <string_view>
+
+#include <fcntl.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+
+// The journal's socket takes datagrams of lines. It is written to directly rather than through libsystemd,
+// which knows one socket only and does not say whether anybody reads it.
+
+namespace typhon {
+
+namespace {
+
+bool isThere(const std::string& path)
+{
+    struct stat status {};
+    return ::stat(path.c_str(), &status) == 0 && S_ISSOCK(status.st_mode);
+}
+
+/// The boot, as the journal names it.
+std::string bootIdentifier()
+{
+    const FileDescriptor file(::open("/proc/sys/kernel/random/boot_id", O_RDONLY | O_CLOEXEC));
+    char text[64];
+    const auto length = file ? ::read(file.get(), text, sizeof text) : 0;
+    std::string identifier;
+    for (const char c : std::string_view(text, static_cast<std::size_t>(length > 0 ? length : 0))) {
+        identifier += c == '-' || c == '\n' ? std::string() : std::string(1, c);
+    }
+    return identifier;
+}
+
+}  // namespace
+
+LinuxAnalytics::LinuxAnalytics(const RootDirectory& root, Log& log, std::string socket)
+    : log_(log), isScratch_(root.isScratch()),
+      destination_(root.isScratch() ? root.real(eventsPath) : std::move(socket))
+{}
+
+void LinuxAnalytics::sendEventLazily(std::string name, std::function<PropertyList()> builder)
+{
+    if (!isCollecting()) {
+        return;
+    }
+    const auto fields = eventFields(name, builder());
+    if (isScratch_) {
+        // An empty line ends an exported entry.
+        writeToFile("_BOOT_ID=" + bootIdentifier() + "\n" + eventText(fields) + "\n");
+    } else {
+        writeToJournal(eventText(fields) + "SYSLOG_IDENTIFIER=typhond\n");
+    }
+}
+
+bool LinuxAnalytics::isCollecting()
+{
+    return isScratch_ ? hasRoomInFile() : isThere(destination_);
+}
+
+bool LinuxAnalytics::hasRoomInFile()
+{
+    struct stat status {};
+    if (::stat(destination_.c_str(), &status) != 0 || status.st_size < largestFile) {
+        return true;
+    }
+    if (!isFull_.exchange(true)) {
+        TYLog_Error(log_, destination_ + " is full: no more analytics events are kept");
+    }
+    return false;
+}
+
+void LinuxAnalytics::writeToFile(const std::string& text)
+{
+    const std::lock_guard lock(writing_);
+    const FileDescriptor file(
+        ::open(destination_.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
+    if (!file || ::write(file.get(), text.data(), text.size()) != static_cast<ssize_t>(text.size())) {
+        TYLog_Error(log_, "an analytics event could not be written to " + destination_);
+    }
+}
+
+void LinuxAnalytics::writeToJournal(const std::string& text)
+{
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    destination_.copy(address.sun_path, sizeof address.sun_path - 1);
+    const FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    if (!socket || ::sendto(socket.get(), text.data(), text.size(), MSG_NOSIGNAL,
+                            reinterpret_cast<const sockaddr*>(&address), sizeof address) < 0) {
+        TYLog_Error(log_, "an analytics event did not reach the journal");
+    }
+}
+
+}  // namespace typhon
