@@ -1,6 +1,5 @@
 #include "registry/per_client_font_info.h"
 
-#include "registry/entry_sharing.h"
 #include "registry/font_directories.h"
 
 // What a client sees follows from three questions: may it see everything, which fonts are its own, and which
@@ -62,6 +61,16 @@ PropertyList merged(const PropertyList& base, const PropertyList& added)
     return all;
 }
 
+void addIfAdmitted(EntrySharing& sharing, const RegistrySnapshot::Entry& item,
+                   const PerClientFontInfo::Filter& filter)
+{
+    const auto& [path, entry] = item;
+    bool noGrant = false;
+    if (filter(path, entry, noGrant)) {
+        sharing.add(path, entry, noGrant);
+    }
+}
+
 void set(PropertyList::Dictionary& dictionary, const char* key, std::optional<PropertyList> value)
 {
     if (value) {
@@ -84,15 +93,27 @@ PropertyList PerClientFontInfo::filterUserFontInfoForAuditToken(const AuditToken
     if (!registry) {
         return {};
     }
-    EntrySharing sharing(platform_.sandbox, token,
-                         withEnumerationCapability || !needs_.isAuditTokenSandboxed(token));
-    for (const auto& [path, entry] : registry->entries()) {
-        bool noGrant = false;
-        if (withFilter(path, entry, noGrant)) {
-            sharing.add(path, entry, noGrant);
-        }
+    auto sharing = sharingWith(token, withEnumerationCapability);
+    for (const auto& entry : registry->entries()) {
+        addIfAdmitted(sharing, entry, withFilter);
     }
     return sharing.take();
+}
+
+PropertyList PerClientFontInfo::filterUserFontInfoForAuditToken(
+    const AuditToken& token, bool withEnumerationCapability, const Filter& withFilter,
+    const std::vector<const RegistrySnapshot::Entry*>& among)
+{
+    auto sharing = sharingWith(token, withEnumerationCapability);
+    for (const auto* entry : among) {
+        addIfAdmitted(sharing, *entry, withFilter);
+    }
+    return sharing.take();
+}
+
+EntrySharing PerClientFontInfo::sharingWith(const AuditToken& token, bool hasEnumeration)
+{
+    return {platform_.sandbox, token, hasEnumeration || !needs_.isAuditTokenSandboxed(token)};
 }
 
 PropertyList
@@ -129,7 +150,7 @@ PropertyList PerClientFontInfo::issuedFontInfo(const AuditToken& token, const st
     if (!registry) {
         return {};
     }
-    EntrySharing sharing(platform_.sandbox, token, !needs_.isAuditTokenSandboxed(token));
+    auto sharing = sharingWith(token, false);
     for (const auto& path : needs_.issuedFontFilePathsForIdentifier(identifier)) {
         // A font that was switched off is on nobody's list, not even of an application it was issued to.
         const auto* entry = registry->entry(path);

@@ -2,6 +2,7 @@
 
 #include "platform/platform.h"
 #include "platform/task.h"
+#include "registry/entry_sharing.h"
 #include "registry/user_font_registry.h"
 
 #include <functional>
@@ -37,6 +38,12 @@ public:
     /// filter, by path, as the client may have them. Walks the whole registry.
     PropertyList filterUserFontInfoForAuditToken(const AuditToken& token, bool withEnumerationCapability,
                                                  const Filter& withFilter);
+    /// The same for a filter that admits nothing outside of `among`, which are entries of the registry: walks
+    /// only them.
+    PropertyList
+    filterUserFontInfoForAuditToken(const AuditToken& token, bool withEnumerationCapability,
+                                    const Filter& withFilter,
+                                    const std::vector<const RegistrySnapshot::Entry*>& among);
 
     /// `fontInfoForAuditToken:withEnumuration:installation:identifier:andFileFilters:foundFontDirectoryName:`.
     /// The enabled entries that a client of these capabilities sees, only those of the allowed paths if such
@@ -75,6 +82,7 @@ private:
         std::optional<std::string> identifier;
     };
 
+    EntrySharing sharingWith(const AuditToken& token, bool hasEnumeration);
     PropertyList checkinReply(const Client& client);
     PropertyList issuedFontInfo(const AuditToken& token, const std::string& identifier);
     PropertyList visibleFonts(const Client& client, std::optional<std::string>& foundDirectoryName);

@@ -2,37 +2,55 @@
 
 #include "registry/font_directories.h"
 
+#include <algorithm>
+#include <iterator>
+
 namespace typhon {
 
-namespace {
-
-PropertyList enabledEntries(const PropertyList::Dictionary& entries)
-{
-    PropertyList::Dictionary enabled;
-    for (const auto& [path, entry] : entries) {
-        if (!isDisabled(entry)) {
-            enabled.emplace_hint(enabled.end(), path, withoutDisabled(entry));
-        }
-    }
-    return enabled;
-}
-
-}  // namespace
+// A large registry fits no cache, and a walk over its entries costs more than anything that is done with each.
+// So there is one walk, which does all there is to do.
 
 RegistrySnapshot::RegistrySnapshot(PropertyList root)
-    : root_(std::move(root)), enumerationView_(enabledEntries(*root_.asDictionary()))
+    : root_(std::move(root)), byPostScriptName_(count()), byFamilyName_(count()), byDirectoryName_(64)
 {
+    PropertyList::Dictionary enabled;
     for (const auto& entry : entries()) {
-        const std::string directory(font_directories::nameOfDirectoryHolding(entry.first));
-        byDirectoryName_[directory].push_back(&entry);
+        const auto& [path, contents] = entry;
+        const bool isEnabled = !isDisabled(contents);
+        addToIndexes(entry, isEnabled);
+        if (isEnabled) {
+            enabled.emplace_hint(enabled.end(), path, withoutDisabled(contents));
+        }
+    }
+    enumerationView_ = std::move(enabled);
+}
+
+void RegistrySnapshot::addToIndexes(const Entry& entry, bool isEnabled)
+{
+    const auto& [path, contents] = entry;
+    byDirectoryName_.add({font_directories::nameOfDirectoryHolding(path), {}, isEnabled}, entry);
+    const auto* faces = contents.find("familyName");
+    if (faces == nullptr) {
+        return;
+    }
+    for (const auto& [postScriptName, family] : *faces->asDictionary()) {
+        const auto& familyName = *family.asString();
+        byPostScriptName_.add({postScriptName, familyName, isEnabled}, entry);
+        byFamilyName_.add({familyName, familyName, isEnabled}, entry);
     }
 }
 
-std::span<const RegistrySnapshot::Entry* const>
-RegistrySnapshot::entriesInDirectoryNamed(std::string_view name) const
+std::vector<const RegistrySnapshot::Entry*>
+RegistrySnapshot::entriesWithAnyFamilyName(const std::vector<std::string>& names) const
 {
-    const auto found = byDirectoryName_.find(name);
-    return found == byDirectoryName_.end() ? std::span<const Entry* const>{} : found->second;
+    std::vector<const Entry*> found;
+    for (const auto& name : names) {
+        std::ranges::copy(entriesWithFamilyName(name), std::back_inserter(found));
+    }
+    std::ranges::sort(found, {}, &Entry::first);
+    const auto repeated = std::ranges::unique(found);
+    found.erase(repeated.begin(), repeated.end());
+    return found;
 }
 
 bool isDisabled(const PropertyList& entry)
@@ -46,8 +64,12 @@ PropertyList withoutDisabled(const PropertyList& entry)
     if (entry.find("disabled") == nullptr) {
         return entry;
     }
-    auto copy = *entry.asDictionary();
-    copy.erase("disabled");
+    PropertyList::Dictionary copy;
+    for (const auto& [key, value] : *entry.asDictionary()) {
+        if (key != "disabled") {
+            copy.emplace_hint(copy.end(), key, value);
+        }
+    }
     return copy;
 }
 

@@ -1,13 +1,11 @@
 #pragma once
 
 #include "platform/property_list.h"
+#include "registry/name_index.h"
 
 #include <cstddef>
-#include <functional>
-#include <span>
 #include <string>
 #include <string_view>
-#include <unordered_map>
 #include <vector>
 
 namespace typhon {
@@ -29,22 +27,49 @@ public:
     /// The entry of a path, or null.
     const PropertyList* entry(std::string_view path) const { return root_.find(path); }
 
-    /// The entries whose file lies in a directory of that name, wherever the directory is, by path.
-    std::span<const Entry* const> entriesInDirectoryNamed(std::string_view name) const;
+    /// What the first entry, by path, that has a face of that PostScript name says of it: the face's family,
+    /// and whether the entry is switched on. Null when no entry has such a face.
+    const NameIndex::FirstMatch* firstWithPostScriptName(std::string_view name) const
+    {
+        return byPostScriptName_.find(name);
+    }
+    /// The same for the first entry that has a face of that family.
+    const NameIndex::FirstMatch* firstWithFamilyName(std::string_view name) const
+    {
+        return byFamilyName_.find(name);
+    }
+
+    // All entries of a kind, by path. The pointers live as long as this.
+
+    /// Those with a face of that PostScript name.
+    std::vector<const Entry*> entriesWithPostScriptName(std::string_view name) const
+    {
+        return byPostScriptName_.entries(name);
+    }
+    /// Those with a face of that family.
+    std::vector<const Entry*> entriesWithFamilyName(std::string_view name) const
+    {
+        return byFamilyName_.entries(name);
+    }
+    /// Those with a face of any of those families, each once.
+    std::vector<const Entry*> entriesWithAnyFamilyName(const std::vector<std::string>& names) const;
+    /// Those whose file lies in a directory of that name, wherever the directory is.
+    std::vector<const Entry*> entriesInDirectoryNamed(std::string_view name) const
+    {
+        return byDirectoryName_.entries(name);
+    }
 
     /// What every client that may enumerate sees: all enabled entries by path, without their "disabled". One
     /// value for all of them, so that the transport encodes it once.
     const PropertyList& enumerationView() const { return enumerationView_; }
 
 private:
-    struct Hash : std::hash<std::string_view> {
-        using is_transparent = void;
-    };
-    // Further indexes (PostScript name and family name to entries) belong here, built by the constructor.
-    using Index = std::unordered_map<std::string, std::vector<const Entry*>, Hash, std::equal_to<>>;
+    void addToIndexes(const Entry& entry, bool isEnabled);
 
     PropertyList root_;
-    Index byDirectoryName_;
+    NameIndex byPostScriptName_;
+    NameIndex byFamilyName_;
+    NameIndex byDirectoryName_;
     PropertyList enumerationView_;
 };
 
