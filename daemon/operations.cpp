@@ -141,8 +141,8 @@ using enum Availability;
 constexpr std::array table{
     DispatchedOperation{wire::checkin, everyone, served, checkin},
     DispatchedOperation{wire::checkinForFontPicker, everyone, served, checkinForFontPicker},
-    DispatchedOperation{wire::requestFonts, everyone, toCome, requestFonts},
-    DispatchedOperation{wire::requestFontsForClient, fontPicker, toCome, requestFontsForClient},
+    DispatchedOperation{wire::requestFonts, everyone, served, requestFonts},
+    DispatchedOperation{wire::requestFontsForClient, fontPicker, served, requestFontsForClient},
     DispatchedOperation{wire::fontChanged, everyone, served, fontChanged},
     DispatchedOperation{wire::updatingUserFonts, everyone, served, updatingUserFonts},
     DispatchedOperation{wire::scheduleFontFilesDeletion, everyone, served, scheduleFontFilesDeletion},

@@ -37,6 +37,12 @@ TyphonDaemon::TyphonDaemon(Platform& platform)
            [this](const std::string& identifier) {
                return issuedPathsLedger_.issuedFontFilePathsForIdentifier(identifier);
            }}),
+      fontNameResolution_(userFontRegistry_, platform.userFontManager),
+      missingFontsDialog_(platform, fontNameResolution_, [this] { return weak_from_this(); }),
+      fontRequests_({platform, *mainHandlerQueue_, userFontRegistry_, perClientFontInfo_, fontNameResolution_,
+                     issuedPathsLedger_, missingFontsDialog_}),
+      fontPickerRequests_(
+          {platform, userFontRegistry_, perClientFontInfo_, fontNameResolution_, issuedPathsLedger_}),
       fontChangeBroadcast_(platform, userFontRegistry_, perClientFontInfo_, notificationCenter_,
                            *mainHandlerQueue_),
       scheduledFontDeletion_(std::make_shared<ScheduledFontDeletion>(platform, [] {}))
@@ -125,6 +131,18 @@ Task<void> TyphonDaemon::resetIssuedFontsFor(std::string identifier, EmptyReply 
     return issuedPathsLedger_.resetIssuedFontsFor(std::move(identifier), std::move(reply));
 }
 
+Task<void> TyphonDaemon::requestFonts(PropertyList::Array requests, DictionaryReply reply)
+{
+    return fontRequests_.requestFonts(std::move(requests), std::move(reply));
+}
+
+Task<void> TyphonDaemon::requestFonts(std::string postScriptName, std::shared_ptr<ListenerEndpoint> forClient,
+                                      BooleanReply reply)
+{
+    return fontPickerRequests_.requestFonts(std::move(postScriptName), std::move(forClient),
+                                            std::move(reply));
+}
+
 Task<void> TyphonDaemon::checkin(OptionalDictionaryReply /*reply*/)
 {
     return doesNotRecognizeSelector("checkin:");
@@ -138,17 +156,6 @@ Task<void> TyphonDaemon::checkinForFontPicker(OptionalDictionaryReply /*reply*/)
 Task<void> TyphonDaemon::sendFonts(PropertyList::Array /*fonts*/, EmptyReply /*reply*/)
 {
     return doesNotRecognizeSelector("sendFonts:reply:");
-}
-
-Task<void> TyphonDaemon::requestFonts(PropertyList::Array /*requests*/, DictionaryReply /*reply*/)
-{
-    return doesNotRecognizeSelector("requestFonts:reply:");
-}
-
-Task<void> TyphonDaemon::requestFonts(std::string /*postScriptName*/,
-                                      std::shared_ptr<ListenerEndpoint> /*forClient*/, BooleanReply /*reply*/)
-{
-    return doesNotRecognizeSelector("requestFonts:forClient:reply:");
 }
 
 Task<void> TyphonDaemon::scheduleFontFilesDeletion(std::vector<std::string> paths)

@@ -12,7 +12,11 @@
 #include "registry/per_client_font_info.h"
 #include "registry/user_font_registry.h"
 #include "registry/user_font_updates.h"
+#include "requests/font_name_resolution.h"
+#include "requests/font_picker_requests.h"
+#include "requests/font_requests.h"
 #include "requests/issued_paths_ledger.h"
+#include "requests/missing_fonts_dialog.h"
 
 #include <memory>
 #include <optional>
@@ -62,7 +66,13 @@ public:
     ClientCapabilities& clientCapabilities() { return clientCapabilities_; }
     UserFontRegistry& userFontRegistry() { return userFontRegistry_; }
     IssuedPathsLedger& issuedPathsLedger() { return issuedPathsLedger_; }
+    FontNameResolution& fontNameResolution() { return fontNameResolution_; }
+    MissingFontsDialog& missingFontsDialog() { return missingFontsDialog_; }
+    FontRequests& fontRequests() { return fontRequests_; }
 
+    Task<void> requestFonts(PropertyList::Array requests, DictionaryReply reply) override;
+    Task<void> requestFonts(std::string postScriptName, std::shared_ptr<ListenerEndpoint> forClient,
+                            BooleanReply reply) override;
     Task<void> fontChanged(PropertyList change, EmptyReply reply) override;
     Task<void> updatingUserFonts(EmptyReply reply) override;
     Task<void> resetIssuedFontsFor(std::string identifier, EmptyReply reply) override;
@@ -72,9 +82,6 @@ public:
     Task<void> checkin(OptionalDictionaryReply reply) override;
     Task<void> checkinForFontPicker(OptionalDictionaryReply reply) override;
     Task<void> sendFonts(PropertyList::Array fonts, EmptyReply reply) override;
-    Task<void> requestFonts(PropertyList::Array requests, DictionaryReply reply) override;
-    Task<void> requestFonts(std::string postScriptName, std::shared_ptr<ListenerEndpoint> forClient,
-                            BooleanReply reply) override;
     Task<void> scheduleFontFilesDeletion(std::vector<std::string> paths) override;
     Task<void> synchronizeFontAssets(std::vector<std::string> paths, OutcomeReply reply) override;
     Task<void> checkinForSilkpageProcess(std::shared_ptr<ListenerEndpoint> endpoint,
@@ -89,6 +96,10 @@ private:
     UserFontRegistry userFontRegistry_;
     IssuedPathsLedger issuedPathsLedger_;
     PerClientFontInfo perClientFontInfo_;
+    FontNameResolution fontNameResolution_;
+    MissingFontsDialog missingFontsDialog_;
+    FontRequests fontRequests_;
+    FontPickerRequests fontPickerRequests_;
     FontChangeBroadcast fontChangeBroadcast_;
     ApplicationRemoval applicationRemoval_;
     const std::shared_ptr<ScheduledFontDeletion> scheduledFontDeletion_;

@@ -4,6 +4,8 @@
 #include "platform/simulated/simulated_platform.h"
 #include "protocol/wire.h"
 
+#include <chrono>
+
 #include <gtest/gtest.h>
 
 namespace typhon {
@@ -253,6 +255,39 @@ TEST_F(TyphonDaemonTest, SendFontsIsNeverAnswered)
     EXPECT_TRUE(outcome->replies.empty());
     EXPECT_TRUE(outcome->errors.empty());
     EXPECT_EQ(call(client, wire::checkin)->replies.size(), 1U);
+}
+
+TEST_F(TyphonDaemonTest, AnApplicationAsksForAFontAndSeesItAtItsNextCheckIn)
+{
+    startUp(*daemon);
+    const auto token = addProcess("com.example.app", {"app-usage"});
+    const auto client = connect(token);
+    const Dictionary request{{kLFFontNameAttribute, "Alpha-Regular"}};
+    const auto requested = call(client, wire::requestFonts, {PropertyList(Array{request})});
+    const auto& fonts = std::get<PropertyList>(requested->replies.at(0).at(0));
+    EXPECT_EQ(fonts.asDictionary()->size(), 2U);
+    simulated.scheduler.advance(std::chrono::seconds(1));
+    const auto reply = call(client, wire::checkin);
+    EXPECT_EQ(reply->dictionary()->find("fontsInfo")->asDictionary()->size(), 2U);
+}
+
+TEST_F(TyphonDaemonTest, ADialogThatNobodyAnswersDoesNotKeepTheDaemonAlive)
+{
+    const std::weak_ptr<TyphonDaemon> observed = daemon;
+    {
+        startUp(*daemon);
+        const auto token = addProcess("com.example.app", {"app-usage"});
+        simulated.processLifecycle.setVisible(token, true);
+        const auto client = connect(token);
+        const Dictionary request{{kLFFontFamilyNameAttribute, "Gamma"}};
+        call(client, wire::requestFonts, {PropertyList(Array{request})});
+        EXPECT_EQ(simulated.remoteAlerts.alerts().size(), 1U);
+        EXPECT_EQ(daemon->missingFontsDialog().missingFontsDialogHandler()->daemon(), daemon);
+        client->invalidate();
+        simulated.drain();
+    }
+    daemon.reset();
+    EXPECT_TRUE(observed.expired());
 }
 
 TEST_F(TyphonDaemonTest, TheSharedDaemonIsMadeOnce)

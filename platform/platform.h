@@ -15,6 +15,8 @@
 #include "platform/user_font_manager.h"
 #include "platform/work_queues.h"
 
+#include <atomic>
+#include <cstdint>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -44,6 +46,27 @@ private:
     std::map<std::string, std::shared_ptr<WorkQueue>> byLabel_;
 };
 
+/// The state of the gate that lets one font request at a time through. Any thread.
+class ProcessWideGate {
+public:
+    explicit ProcessWideGate(WorkQueues& queues) : queues_(queues) {}
+
+    /// Of initial count one, created on first use.
+    Semaphore& semaphore()
+    {
+        std::call_once(once_, [this] { semaphore_ = queues_.createSemaphore(1); });
+        return *semaphore_;
+    }
+
+    /// Requests that were admitted or wait.
+    std::atomic<std::int32_t> inFlight{0};
+
+private:
+    WorkQueues& queues_;
+    std::once_flag once_;
+    std::shared_ptr<Semaphore> semaphore_;
+};
+
 /// Every service the daemon stands on, and what is process-wide. Built by `main` (or by a test), which
 /// keeps the services alive for as long as anything uses them.
 struct Platform {
@@ -65,6 +88,7 @@ struct Platform {
     bool isInternalBuild = false;
 
     ProcessWideQueues processWideQueues{queues};
+    ProcessWideGate requestGate{queues};
 };
 
 }  // namespace typhon

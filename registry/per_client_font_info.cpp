@@ -100,9 +100,10 @@ PropertyList PerClientFontInfo::filterUserFontInfoForAuditToken(const AuditToken
     return sharing.take();
 }
 
-PropertyList PerClientFontInfo::filterUserFontInfoForAuditToken(
-    const AuditToken& token, bool withEnumerationCapability, const Filter& withFilter,
-    const std::vector<const RegistrySnapshot::Entry*>& among)
+PropertyList
+PerClientFontInfo::filterUserFontInfoForAuditToken(const AuditToken& token, bool withEnumerationCapability,
+                                                   const Filter& withFilter,
+                                                   const std::vector<const RegistrySnapshot::Entry*>& among)
 {
     auto sharing = sharingWith(token, withEnumerationCapability);
     for (const auto* entry : among) {

@@ -40,10 +40,9 @@ public:
                                                  const Filter& withFilter);
     /// The same for a filter that admits nothing outside of `among`, which are entries of the registry: walks
     /// only them.
-    PropertyList
-    filterUserFontInfoForAuditToken(const AuditToken& token, bool withEnumerationCapability,
-                                    const Filter& withFilter,
-                                    const std::vector<const RegistrySnapshot::Entry*>& among);
+    PropertyList filterUserFontInfoForAuditToken(const AuditToken& token, bool withEnumerationCapability,
+                                                 const Filter& withFilter,
+                                                 const std::vector<const RegistrySnapshot::Entry*>& among);
 
     /// `fontInfoForAuditToken:withEnumuration:installation:identifier:andFileFilters:foundFontDirectoryName:`.
     /// The enabled entries that a client of these capabilities sees, only those of the allowed paths if such

@@ -7,8 +7,8 @@
 
 namespace typhon {
 
-// A large registry fits no cache, and a walk over its entries costs more than anything that is done with each.
-// So there is one walk, which does all there is to do.
+// A large registry fits no cache, and a walk over its entries costs more than anything that is done with
+// each. So there is one walk, which does all there is to do.
 
 RegistrySnapshot::RegistrySnapshot(PropertyList root)
     : root_(std::move(root)), byPostScriptName_(count()), byFamilyName_(count()), byDirectoryName_(64)
