@@ -109,6 +109,16 @@ TEST_F(RequestAnswersTest, AnswersThatNameNothingOrAreMalformedSwitchNothingOn)
     EXPECT_EQ(calls(), Names{});
 }
 
+TEST_F(RequestAnswersTest, TheUserMaySwitchOnAFamilyThatWasNotAskedFor)
+{
+    const auto deltaPath = fontFiles + "com.example.foundry/delta.ttf";
+    world.install(deltaPath, {{"Delta-Regular", "Delta"}}, true);
+    ViewService service(world, 0);
+    service.answer({choice("Delta", "com.example.foundry")});
+    EXPECT_EQ(client.paths(), (Names{alphaPath, deltaPath}));
+    EXPECT_TRUE(world.isSwitchedOn(deltaPath));
+}
+
 TEST_F(RequestAnswersTest, OfSeveralAnswersForOneFamilyTheLastProviderCounts)
 {
     ViewService service(world, 0);

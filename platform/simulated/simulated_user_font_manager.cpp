@@ -114,7 +114,7 @@ void SimulatedUserFontManager::enableOrDisablePersistentURLs(std::vector<std::st
             for (const auto& url : urls) {
                 const auto path = pathFromFileUrl(url);
                 const auto found = path ? entries.find(*path) : entries.end();
-                if (found == entries.end()) {
+                if (found == entries.end() || found->second.asDictionary() == nullptr) {
                     return url + " is not registered";
                 }
                 auto entry = *found->second.asDictionary();

@@ -3,6 +3,8 @@
 #include "simulation/simulated_clients.h"
 #include "simulation/world.h"
 
+#include <chrono>
+
 // A run is a number of steps, each of which lets one client act or changes the device, posted so that the
 // scheduler mixes them with everything that the daemon does meanwhile. Every answer is judged as it arrives,
 // against the most its client may have been told; then the device is left in peace, and every client that is
@@ -16,24 +18,17 @@ constexpr std::uint64_t stepsOfARun = 120;
 
 class Run {
 public:
-    explicit Run(std::uint64_t seed) : world_(seed)
-    {
-        using Array = PropertyList::Array;
-        using Dictionary = PropertyList::Dictionary;
-        world_.simulated.applicationRegistry.install({"com.example.barred", "1.0", false});
-        world_.simulated.applicationRegistry.install({"com.example.editor", "1.0", false});
-        world_.daemon->clientCapabilities().setFontEnumerationProhibitedInfo(
-            Array{Dictionary{{"com.example.barred", Array{"0.9", "1.0"}}},
-                  Dictionary{{"com.example.editor", Array{"1.1"}}}});
-    }
+    explicit Run(std::uint64_t seed) : world_(seed) {}
 
     Findings findings()
     {
         startUp(*world_.daemon);
         for (std::uint64_t step = 0; step < stepsOfARun; ++step) {
-            world_.simulated.scheduler.post(this, [this] { takeStep(); });
+            const std::chrono::milliseconds time(pick(30'000));
+            world_.simulated.scheduler.schedule(time, [this] { takeStep(); });
         }
-        world_.simulated.drain();
+        // Font requests pause, one after another, and who waits for a process waits for long.
+        world_.simulated.scheduler.advance(std::chrono::minutes(10));
         settle();
         leave();
         return {world_.violations, world_.simulated.log.text()};

@@ -111,7 +111,7 @@ void SimulatedClient::callSomething()
         call(wire::sendFonts, list)->isNeverAnswered = true;
         break;
     case 3:
-        call(wire::requestFonts, list, nullptr, ipc_errors::notSupported);
+        call(wire::requestFonts, list);
         break;
     case 4:
         call(wire::fontChanged, {someReport(world_)});
@@ -123,8 +123,8 @@ void SimulatedClient::callSomething()
         checkInContent();
         break;
     case 7:
-        call(wire::requestFontsForClient, {PropertyList("Alpha"), endpoint}, nullptr,
-             kind_.isFontPicker ? ipc_errors::notSupported : ipc_errors::accessDenied);
+        call(wire::requestFontsForClient, {PropertyList("Alpha-Regular"), endpoint}, nullptr,
+             kind_.isFontPicker ? std::nullopt : std::optional<std::string>(ipc_errors::accessDenied));
         break;
     case 8:
         if (isHostile_) {

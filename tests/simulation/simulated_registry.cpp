@@ -18,7 +18,44 @@ constexpr std::array directories{
     "/private/var/Cargon/AssetsV2/com_vorlan_Cargon_Font7/abc.asset/AssetData/",
 };
 
+/// PostScript name to family.
+const std::vector<Dictionary>& faceSets()
+{
+    static const std::vector<Dictionary> sets{
+        {{"Alpha-Regular", "Alpha"}},
+        {{"Beta-Regular", "Beta"}},
+        {{"Alpha-Bold", "Alpha"}, {"Beta-Bold", "Beta"}},
+        // Two files that disagree about a face.
+        {{"Alpha-Regular", "Beta"}},
+    };
+    return sets;
+}
+
 }  // namespace
+
+const std::vector<std::string>& SimulatedRegistry::familyNames()
+{
+    static const std::vector<std::string> names{"Alpha", "Beta"};
+    return names;
+}
+
+const std::vector<std::string>& SimulatedRegistry::postScriptNames()
+{
+    static const std::vector<std::string> names{"Alpha-Regular", "Alpha-Bold", "Beta-Regular", "Beta-Bold"};
+    return names;
+}
+
+std::set<std::string> SimulatedRegistry::familiesOf(const std::string& postScriptName)
+{
+    std::set<std::string> families;
+    for (const auto& faces : faceSets()) {
+        const auto found = faces.find(postScriptName);
+        if (found != faces.end()) {
+            families.insert(*found->second.asString());
+        }
+    }
+    return families;
+}
 
 std::string SimulatedRegistry::somePath()
 {
@@ -33,7 +70,9 @@ void SimulatedRegistry::changeSomething()
     if (scheduler.pick(4) == 0) {
         fonts_.erase(somePath());
     } else {
-        fonts_.insert_or_assign(somePath(), static_cast<State>(scheduler.pick(6)));
+        const auto path = somePath();
+        const auto state = static_cast<State>(scheduler.pick(6));
+        fonts_.insert_or_assign(path, Font{state, scheduler.pick(faceSets().size())});
     }
     write();
 }
@@ -47,8 +86,8 @@ void SimulatedRegistry::repair()
 std::set<std::string> SimulatedRegistry::enabled() const
 {
     std::set<std::string> paths;
-    for (const auto& [path, state] : fonts_) {
-        if (!isUnreadable_ && (state == State::enabled || state == State::enabledWithKey)) {
+    for (const auto& [path, font] : fonts_) {
+        if (!isUnreadable_ && (font.state == State::enabled || font.state == State::enabledWithKey)) {
             paths.insert(path);
         }
     }
@@ -62,19 +101,45 @@ void SimulatedRegistry::write()
         return;
     }
     Dictionary root;
-    for (const auto& [path, state] : fonts_) {
-        Dictionary entry{{"familyName", Dictionary{{"Alpha-Regular", "Alpha"}}}};
-        if (state == State::enabledWithKey || state == State::disabled) {
-            entry.emplace("disabled", state == State::disabled);
-        } else if (state == State::wrongDisabled) {
-            entry.emplace("disabled", "true");
-        } else if (state == State::wrongFamilyName) {
-            entry.insert_or_assign("familyName", "Alpha");
-        }
-        root.emplace(path, state == State::notADictionary ? PropertyList("?") : PropertyList(entry));
+    for (const auto& [path, font] : fonts_) {
+        root.emplace(path, entryOf(font));
+        remember(path, font);
     }
     simulated_.fileSystem.addFile(registryPath, std::move(root));
     everEnabled_.merge(enabled());
+}
+
+PropertyList SimulatedRegistry::entryOf(const Font& font)
+{
+    Dictionary entry{{"familyName", faceSets()[font.faces]}};
+    switch (font.state) {
+    case State::enabledWithKey:
+    case State::disabled:
+        entry.emplace("disabled", font.state == State::disabled);
+        break;
+    case State::wrongDisabled:
+        entry.emplace("disabled", "true");
+        break;
+    case State::wrongFamilyName:
+        entry.insert_or_assign("familyName", "Alpha");
+        break;
+    case State::notADictionary:
+        return "?";
+    case State::enabled:
+        break;
+    }
+    return entry;
+}
+
+void SimulatedRegistry::remember(const std::string& path, const Font& font)
+{
+    const bool isEnabled = font.state == State::enabled || font.state == State::enabledWithKey;
+    if (!isEnabled && font.state != State::disabled) {
+        return;
+    }
+    for (const auto& [postScriptName, family] : faceSets()[font.faces]) {
+        (isEnabled ? everEnabledWith_ : everDisabledWith_).emplace(path, *family.asString());
+    }
 }
 
 }  // namespace typhon::simulation

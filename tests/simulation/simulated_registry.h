@@ -2,9 +2,12 @@
 
 #include "platform/simulated/simulated_platform.h"
 
+#include <cstddef>
 #include <map>
 #include <set>
 #include <string>
+#include <utility>
+#include <vector>
 
 namespace typhon::simulation {
 
@@ -27,15 +30,40 @@ public:
     /// The fonts that were to be seen at some time so far.
     const std::set<std::string>& everEnabled() const { return everEnabled_; }
 
+    /// The families that some font ever had, and the face names, none of which says which family it is in.
+    static const std::vector<std::string>& familyNames();
+    static const std::vector<std::string>& postScriptNames();
+    /// The families that the face was ever in.
+    static std::set<std::string> familiesOf(const std::string& postScriptName);
+    /// Whether the font ever had a face of that family while it was enabled, or while it was disabled.
+    bool wasEnabledWith(const std::string& path, const std::string& family) const
+    {
+        return everEnabledWith_.contains({path, family});
+    }
+    bool wasDisabledWith(const std::string& path, const std::string& family) const
+    {
+        return everDisabledWith_.contains({path, family});
+    }
+
 private:
     enum class State { enabled, enabledWithKey, disabled, notADictionary, wrongDisabled, wrongFamilyName };
 
+    struct Font {
+        State state;
+        /// Which of the sets of faces it has.
+        std::size_t faces;
+    };
+
+    static PropertyList entryOf(const Font& font);
+    void remember(const std::string& path, const Font& font);
     void write();
 
     SimulatedPlatform& simulated_;
-    std::map<std::string, State> fonts_;
+    std::map<std::string, Font> fonts_;
     bool isUnreadable_ = false;
     std::set<std::string> everEnabled_;
+    std::set<std::pair<std::string, std::string>> everEnabledWith_;
+    std::set<std::pair<std::string, std::string>> everDisabledWith_;
 };
 
 }  // namespace typhon::simulation

@@ -15,7 +15,16 @@ namespace typhon::simulation {
 
 /// A simulated device with its daemon, and what must be remembered of its past to judge the daemon by.
 struct World {
-    explicit World(std::uint64_t seed) : simulated(seed) {}
+    explicit World(std::uint64_t seed) : simulated(seed)
+    {
+        using Array = PropertyList::Array;
+        using Dictionary = PropertyList::Dictionary;
+        simulated.applicationRegistry.install({"com.example.barred", "1.0", false});
+        simulated.applicationRegistry.install({"com.example.editor", "1.0", false});
+        daemon->clientCapabilities().setFontEnumerationProhibitedInfo(
+            Array{Dictionary{{"com.example.barred", Array{"0.9", "1.0"}}},
+                  Dictionary{{"com.example.editor", Array{"1.1"}}}});
+    }
 
     void report(const std::string& who, const std::string& violation)
     {

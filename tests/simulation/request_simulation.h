@@ -1,0 +1,13 @@
+#pragma once
+
+#include "simulation/daemon_simulation.h"
+
+#include <cstdint>
+
+namespace typhon::simulation {
+
+/// Runs the daemon with applications that ask for fonts, again and again, with a user who answers dialogs or
+/// not, twice or with nonsense, and with fonts that change meanwhile. Everything follows from the seed.
+Findings simulateRequests(std::uint64_t seed);
+
+}  // namespace typhon::simulation
