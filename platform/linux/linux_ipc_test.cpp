@@ -318,6 +318,31 @@ TEST(LinuxIpc, AnEndpointMustBeASocketOfItsSender)
     EXPECT_EQ(service.log.countContaining("cannot connect"), 2U);
 }
 
+TEST(LinuxIpc, ConnectionsToItsEndpointsCountForAProcessUntilTheyEnd)
+{
+    IpcLimits limits;
+    limits.connectionsPerProcess = 2;
+    TestedService service(limits);
+    const TestFolder folder;
+    const auto listening = listenAt(folder.path, "silent");
+    ASSERT_TRUE(listening.socket);
+    const auto attempt = [&] {
+        return std::make_unique<EndpointAttempt>(
+            service, FileDescriptor(::open((folder.path + "/silent").c_str(), O_PATH | O_CLOEXEC)),
+            std::nullopt);
+    };
+    auto first = attempt();
+    const auto second = attempt();
+    EXPECT_EQ(service.log.countContaining("cannot connect"), 0U);
+    const auto third = attempt();
+    EXPECT_TRUE(service.log.waitFor("its process has too many connections"));
+    EXPECT_TRUE(service.log.waitFor("endpoint refused"));
+    first.reset();
+    EXPECT_TRUE(service.log.waitFor("endpoint refused", 2));
+    const auto fourth = attempt();
+    EXPECT_EQ(service.log.countContaining("cannot connect"), 1U);
+}
+
 TEST(LinuxIpc, AnEndpointWhoseMakerIsGoneIsRefused)
 {
     bool gone = false;
