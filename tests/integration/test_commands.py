@@ -12,7 +12,8 @@ import unittest
 
 from scratch_system import BIN, FONT_FILES, ScratchSystem, entry
 
-COMMANDS = ("keygen", "trust", "sign", "run", "checkin", "open", "monitor", "ledger", "preferences", "plist", "fonts")
+COMMANDS = ("keygen", "trust", "sign", "run", "checkin", "open", "monitor", "ledger", "preferences", "plist", "fonts",
+            "applications", "post-notification")
 PATH = f"{FONT_FILES}/org.example.foundry/a.ttf"
 
 
