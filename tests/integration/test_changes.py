@@ -172,7 +172,7 @@ class Changes(ChangingSystem):
                 self.reporter.call("TyphonProtocol", "fontChanged_reply",
                                    plain.new_tuple(plain("a{sv}", change)))
         self.settle()
-        self.assertEqual(len(self.system.daemon.lines_with("got invalid font path: /elsewhere.ttf")), 1)
+        self.system.daemon.wait_for_line("got invalid font path: /elsewhere.ttf")
         self.assertEqual(enumerating.end(), (b"", 0))
 
     def test_the_font_picker_is_not_told(self):
