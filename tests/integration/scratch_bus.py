@@ -26,7 +26,6 @@ class Bus:
     def __init__(self, system, user=None):
         system.root.mkdir(exist_ok=True)
         self.address = f"unix:path={system.real(SOCKET)}"
-        # A session of its own keeps the bus from the terminal's signals, not from ours.
         self._process = subprocess.Popen([str(SCRATCH_BUS), str(system.root), *([user] if user else [])],
                                          stdin=subprocess.DEVNULL, stderr=subprocess.DEVNULL)
         eventually(self._answers)
@@ -133,6 +132,12 @@ class Peer:
             return len(self.signals) >= count
         eventually(arrived)
         return self.signals
+
+
+def wait_for_relay(bus):
+    peer = Peer(bus)
+    eventually(lambda: peer.owner_of(PING) and peer.owner_of(RELAY))
+    peer.close()
 
 
 def error_name(error):

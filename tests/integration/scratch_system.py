@@ -88,9 +88,12 @@ class ScratchSystem:
             self.real(directory).mkdir(parents=True)
         self._serial = 0
         self._keys = {}
+        self._helpers = []
 
     def close(self):
         self.stop()
+        while self._helpers:
+            self._helpers.pop().stop()
         shutil.rmtree(self.folder, ignore_errors=True)
 
     def __enter__(self):
@@ -235,6 +238,15 @@ class ScratchSystem:
             with contextlib.suppress(ChildProcessError):
                 os.waitpid(pid, 0)
             self.real(HELPER_PID).unlink(missing_ok=True)
+
+    def start_bus(self, window=0.5):
+        """Runs a system bus with the notification relay on it until `close`; gives the bus (see scratch_bus)."""
+        import scratch_bus
+        bus = scratch_bus.Bus(self)
+        self._helpers.append(bus)
+        self._helpers.append(scratch_bus.Relay(self, window))
+        scratch_bus.wait_for_relay(bus)
+        return bus
 
     def restart(self, *arguments):
         self.stop()

@@ -11,7 +11,7 @@ import unittest
 from gi.repository import GLib
 
 import foreign_client
-from scratch_bus import PING, RELAY, Bus, Peer, Relay, another_user, refusal_of
+from scratch_bus import PING, RELAY, Bus, Peer, Relay, another_user, refusal_of, wait_for_relay
 from scratch_system import BIN, PATIENCE, ScratchSystem, eventually
 
 ACCESS_DENIED = "org.freedesktop.DBus.Error.AccessDenied"
@@ -79,12 +79,8 @@ class OnABus(unittest.TestCase):
         relay = Relay(self.system, **options)
         self.addCleanup(relay.stop)
         if bus:
-            self.wait_for_relay(bus)
+            wait_for_relay(bus)
         return relay
-
-    def wait_for_relay(self, bus):
-        peer = self.peer(bus)
-        eventually(lambda: peer.owner_of(PING) and peer.owner_of(RELAY))
 
     def peer(self, bus):
         peer = Peer(bus)
@@ -153,11 +149,11 @@ class Announcing(OnABus):
         relay = self.relay(None)
         relay.wait_for_line("no system bus at")
         bus = Bus(self.system)
-        self.wait_for_relay(bus)
+        wait_for_relay(bus)
         bus.stop()
         relay.wait_for_line("lost the system bus at")
         bus = self.bus()
-        self.wait_for_relay(bus)
+        wait_for_relay(bus)
         listener = self.listener(bus)
         self.peer(bus).post(PING, named("again"))
         self.assertEqual(listener.wait_for_signals(1), [(PING, ("again",))])
@@ -257,7 +253,7 @@ class Listening(OnABus):
         for round_ in range(2):
             bus = Bus(self.system)
             relay = Relay(self.system)
-            self.wait_for_relay(bus)
+            wait_for_relay(bus)
             poster = self.peer(bus)
             self.wait_until_heard(echo, lambda: poster.post(PING, named("probe")))
             relay.stop()
@@ -425,8 +421,7 @@ class TheDaemon(OnABus):
         self.assertIsNotNone(self.system.ctl("checkin"))
 
     def test_a_reported_change_is_announced_to_the_whole_system(self):
-        bus = self.bus()
-        self.relay(bus)
+        bus = self.system.start_bus()
         listener = self.listener(bus)
         self.system.sign(os.path.realpath(sys.executable), "org.example.foundry", ["system-installation"])
         self.system.start()
