@@ -16,8 +16,8 @@
 #include <unistd.h>
 
 // Readings take turns with a few font-reading processes, which are started when they are needed and kept. One
-// that fails is thrown away. A reading is tried once more when its process had ended, as after somebody
-// killed it; a file cannot do that to it.
+// of which a reader came to a bad end is thrown away. A reading is tried once more when its process had
+// ended, as after somebody killed it; a file cannot do that to it.
 
 namespace typhon {
 
@@ -120,7 +120,9 @@ FontNamesReading FontParser::read(int descriptor)
         auto outcome = problem.empty()
                            ? zygote->read(file.descriptor, request, largestFontAnswer(limits_.font))
                            : std::nullopt;
-        giveBack(outcome ? std::move(zygote) : nullptr);
+        // Any other report may be about a reader that never got the request, which the next one then takes.
+        const bool isSound = outcome && outcome->report.end == FontReadingEnd::done;
+        giveBack(isSound ? std::move(zygote) : nullptr);
         if (!problem.empty()) {
             return failure(std::move(problem));
         }

@@ -90,6 +90,12 @@ bool waitFor(std::span<pollfd> events, Clock::time_point deadline)
     }
 }
 
+bool isReadable(int socket)
+{
+    pollfd event{socket, POLLIN, 0};
+    return ::poll(&event, 1, 0) != 0;
+}
+
 template <typename Packet>
 std::optional<Packet> receive(int socket)
 {
@@ -184,6 +190,10 @@ void FontZygote::greet()
 std::optional<FontZygote::Outcome> FontZygote::read(int descriptor, const FontRequest& request,
                                                     std::size_t largestAnswer)
 {
+    if (isReadable(control_.get())) {
+        // It has ended, or a reader was killed before it was asked for anything.
+        return std::nullopt;
+    }
     std::array<int, 2> ends{};
     if (::pipe2(ends.data(), O_CLOEXEC) != 0) {
         return Outcome{.report = {FontReadingEnd::notStarted, errno}, .answer = {}};

@@ -104,14 +104,13 @@ void allowMemory(SyscallFilter& filter)
         .allow(SYS_madvise);
 }
 
-/// The sanitizers' runtimes protect pages, make threads, and have locks and stacks for signals of their own.
+/// The sanitizers' runtimes protect pages, and have locks and stacks for signals of their own.
 void allowSanitizers(SyscallFilter& filter)
 {
     if (!isSanitized) {
         return;
     }
-    constexpr uint32_t thread = CLONE_VM | CLONE_FS | CLONE_FILES | CLONE_SIGHAND | CLONE_THREAD;
-    filter.allow(SYS_clone, {{0, Kind::hasAll, thread}}).allow(SYS_mprotect, {{2, Kind::hasNone, PROT_EXEC}});
+    filter.allow(SYS_mprotect, {{2, Kind::hasNone, PROT_EXEC}});
     for (const long call :
          {SYS_futex, SYS_sched_yield, SYS_sigaltstack, SYS_rt_sigprocmask, SYS_rt_sigaction, SYS_gettid,
           SYS_getpid, SYS_getrlimit, SYS_clock_nanosleep, SYS_nanosleep, SYS_set_robust_list, SYS_rseq,
@@ -133,6 +132,15 @@ int installReaderFilter()
     return filter.install();
 }
 
+/// The thread sanitizer starts a thread of its own in each new process, before that is confined further.
+void allowThreadOfSanitizer(SyscallFilter& filter)
+{
+    constexpr uint32_t thread = CLONE_VM | CLONE_FS | CLONE_FILES | CLONE_SIGHAND | CLONE_THREAD;
+    if (isSanitized) {
+        filter.allow(SYS_clone, {{0, Kind::hasAll, thread}}).refuse(SYS_clone3, ENOSYS);
+    }
+}
+
 int installZygoteFilter()
 {
     SyscallFilter filter;
@@ -151,6 +159,7 @@ int installZygoteFilter()
     }
     allowMemory(filter);
     allowSanitizers(filter);
+    allowThreadOfSanitizer(filter);
     return filter.install();
 }
 

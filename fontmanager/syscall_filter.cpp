@@ -86,6 +86,13 @@ SyscallFilter& SyscallFilter::allow(long number, const std::vector<Condition>& c
     return *this;
 }
 
+SyscallFilter& SyscallFilter::refuse(long number, int error)
+{
+    program_.push_back(jump(BPF_JEQ, static_cast<std::uint32_t>(number), 0, 1));
+    program_.push_back(answer(SECCOMP_RET_ERRNO | static_cast<std::uint32_t>(error)));
+    return *this;
+}
+
 int SyscallFilter::install()
 {
     if (architecture == 0) {

@@ -25,6 +25,9 @@ public:
     /// Allows the call when all of the conditions hold. A call may be named several times.
     SyscallFilter& allow(long number, const std::vector<Condition>& conditions = {});
 
+    /// Lets the call fail with that errno, for callers that then do it in another way.
+    SyscallFilter& refuse(long number, int error);
+
     /// Installs it for this thread and what it starts, forever. 0 or an errno. The process must have given
     /// up new privileges before.
     int install();

@@ -58,7 +58,7 @@ public:
     }
 
 private:
-    sd_bus_error error_ = SD_BUS_ERROR_NULL;
+    sd_bus_error error_{};
 };
 
 /// Takes over the socket when it succeeds.
