@@ -12,10 +12,11 @@
 #include <csignal>
 #include <filesystem>
 #include <system_error>
-#include <thread>
 #include <vector>
 
 #include <fcntl.h>
+#include <poll.h>
+#include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -35,9 +36,11 @@ ClientError notThere(const std::string& why)
             "Start typhond, which brings it up, or typhon-fontmanagerd itself."};
 }
 
-/// In the child: no other thread runs here, so only what is safe after a fork is called.
-[[noreturn]] void becomeHelper(const char* program, char* const* arguments, const char* log)
+/// In the child: no other thread runs here, so only what is safe after a fork is called. The helper keeps
+/// `sign` open for as long as it lives.
+[[noreturn]] void becomeHelper(const char* program, char* const* arguments, const char* log, int sign)
 {
+    constexpr int signOfLife = STDERR_FILENO + 1;
     ::setsid();
     if (::fork() != 0) {
         ::_exit(0);
@@ -47,7 +50,12 @@ ClientError notThere(const std::string& why)
     ::dup2(input, STDIN_FILENO);
     ::dup2(output < 0 ? input : output, STDOUT_FILENO);
     ::dup2(output < 0 ? input : output, STDERR_FILENO);
-    ::close_range(STDERR_FILENO + 1, ~0U, 0);
+    if (::dup2(sign, signOfLife) == sign) {
+        ::fcntl(sign, F_SETFD, 0);
+    }
+    ::close_range(signOfLife + 1, ~0U, 0);
+    // What the daemon may do beyond others is not for the helper.
+    ::prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0, 0, 0);
     sigset_t none;
     ::sigemptyset(&none);
     ::pthread_sigmask(SIG_SETMASK, &none, nullptr);
@@ -55,7 +63,8 @@ ClientError notThere(const std::string& why)
     ::_exit(127);
 }
 
-void startDetached(const std::string& program, const RootDirectory& root)
+/// Gives a pipe that ends when the helper does.
+FileDescriptor startDetached(const std::string& program, const RootDirectory& root)
 {
     std::vector<std::string> words{program};
     if (root.isScratch()) {
@@ -67,13 +76,28 @@ void startDetached(const std::string& program, const RootDirectory& root)
     }
     arguments.push_back(nullptr);
     const auto log = root.real(helper_files::log);
+    std::array<int, 2> ends{-1, -1};
+    if (::pipe2(ends.data(), O_CLOEXEC) != 0) {
+        return {};
+    }
+    FileDescriptor life(ends[0]);
+    const FileDescriptor sign(ends[1]);
     const pid_t child = ::fork();
     if (child == 0) {
-        becomeHelper(program.c_str(), arguments.data(), log.c_str());
+        becomeHelper(program.c_str(), arguments.data(), log.c_str(), sign.get());
     }
     int status = 0;
     while (child > 0 && ::waitpid(child, &status, 0) < 0 && errno == EINTR) {
     }
+    return life;
+}
+
+/// Waits a moment; true when the helper has ended meanwhile.
+bool hasEnded(const FileDescriptor& life)
+{
+    constexpr int moment = 5;
+    pollfd waited{.fd = life.get(), .events = POLLIN, .revents = 0};
+    return ::poll(&waited, 1, moment) > 0;
 }
 
 ClientResult<ServiceConnection> connectOnce(const RootDirectory& root)
@@ -88,16 +112,17 @@ bool isNobodyThere(const ClientResult<ServiceConnection>& connection)
 
 ClientResult<ServiceConnection> startAndConnect(const RootDirectory& root, const std::string& program)
 {
-    startDetached(program, root);
+    const auto life = startDetached(program, root);
     const auto deadline = std::chrono::steady_clock::now() + patience;
-    while (std::chrono::steady_clock::now() < deadline) {
+    bool isAlive = static_cast<bool>(life);
+    while (isAlive && std::chrono::steady_clock::now() < deadline) {
         auto connection = connectOnce(root);
         if (!isNobodyThere(connection)) {
             return connection;
         }
-        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+        isAlive = !hasEnded(life);
     }
-    return notThere(" and did not come up; its log is " + root.real(helper_files::log));
+    return notThere(" and did not come up; see " + root.real(helper_files::log));
 }
 
 }  // namespace
@@ -106,8 +131,7 @@ std::optional<std::string> helperProgram()
 {
     std::error_code error;
     const auto own = std::filesystem::read_symlink("/proc/self/exe", error).parent_path();
-    for (const auto& folder :
-         {own, std::filesystem::path("/usr/libexec"), std::filesystem::path("/usr/sbin")}) {
+    for (const auto& folder : {own, std::filesystem::path("/usr/libexec/typhon")}) {
         const auto candidate = (folder / helper_files::program).string();
         if (!folder.empty() && ::access(candidate.c_str(), X_OK) == 0) {
             return candidate;

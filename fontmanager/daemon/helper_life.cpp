@@ -29,17 +29,21 @@ HelperLife::HelperLife(RootDirectory root, Options options)
     : root_(std::move(root)), options_(options), socket_(inodeOfSocket(root_))
 {}
 
-std::optional<std::string> HelperLife::announce() const
+std::optional<std::string> HelperLife::announce(const RootDirectory& root)
 {
+    constexpr mode_t directoryPermissions = 0755;
+    if (auto error = makeDirectories(root.real(helper_files::runDirectory), directoryPermissions)) {
+        return error;
+    }
     const auto text = std::to_string(::getpid()) + "\n";
     constexpr mode_t permissions = 0644;
-    return replaceFile(root_.real(helper_files::processIdentifier),
+    return replaceFile(root.real(helper_files::processIdentifier),
                        std::vector<std::uint8_t>(text.begin(), text.end()), permissions);
 }
 
-void HelperLife::withdraw() const
+void HelperLife::withdraw(const RootDirectory& root)
 {
-    ::unlink(root_.real(helper_files::processIdentifier).c_str());
+    ::unlink(root.real(helper_files::processIdentifier).c_str());
 }
 
 bool HelperLife::isSocketMine() const

@@ -23,11 +23,13 @@ public:
         /// The service manager holds the socket.
         bool isSocketActivated = false;
     };
+    /// The socket is there already.
     HelperLife(RootDirectory root, Options options);
 
-    /// Writes the file that tells the process identifier. Null, or why it cannot.
-    std::optional<std::string> announce() const;
-    void withdraw() const;
+    /// Writes the file that tells the process identifier, before there is a socket, so that whoever can
+    /// connect can read it. Null, or why it cannot.
+    static std::optional<std::string> announce(const RootDirectory& root);
+    static void withdraw(const RootDirectory& root);
 
     /// Why it is time to end, or null. `connections` are those open now.
     std::optional<std::string> reasonToEnd(std::size_t connections,

@@ -66,9 +66,9 @@ TEST_F(HelperLifeTest, WithASocketOfTheServiceManagerItEndsWhenIdle)
 
 TEST_F(HelperLifeTest, ItsProcessIdentifierIsThereWhileItLives)
 {
-    EXPECT_EQ(life.announce(), std::nullopt);
+    EXPECT_EQ(HelperLife::announce(root), std::nullopt);
     EXPECT_EQ(scratch.readFile(helper_files::processIdentifier), std::to_string(::getpid()) + "\n");
-    life.withdraw();
+    HelperLife::withdraw(root);
     EXPECT_EQ(scratch.readFile(helper_files::processIdentifier), "");
 }
 

@@ -132,18 +132,18 @@ int run(const Options& options)
                                    .log = helper.log},
         OwnUser{.user = ::geteuid(), .isServiceUser = !helper.root.isScratch() && runsAsServiceUser()});
     const bool isSocketActivated = sd_listen_fds(0) > 0;
+    if (const auto error = isSocketActivated ? std::nullopt : HelperLife::announce(helper.root)) {
+        TYLog_Error(helper.log, *error);
+    }
     const auto listener = startFontRegistryService(helper.ipc, service);
     HelperLife life(helper.root, {.idle = std::chrono::seconds(options.idleSeconds),
                                   .isSocketActivated = isSocketActivated});
-    if (const auto error = isSocketActivated ? std::nullopt : life.announce()) {
-        TYLog_Error(helper.log, *error);
-    }
     const auto reporting = helper.queues.createSerialQueue("com.vorlan.typhond.interruptedChange");
     reporting->async(reportCompleted(helper, std::move(opening.change)));
     waitForTheEnd(life, *service, helper.log);
     listener->invalidate();
     if (!isSocketActivated) {
-        life.withdraw();
+        HelperLife::withdraw(helper.root);
     }
     // Whatever is under way in other threads may end in its middle: it is all or none.
     ::_exit(0);

@@ -1,14 +1,16 @@
-// The two services of this room over real connections.
+// The services of this room over real connections.
 
 #include "platform/linux/audit_tokens.h"
 #include "platform/linux/bus_message.h"
 #include "platform/linux/file_access_broker.h"
+#include "platform/linux/identities_service.h"
 #include "platform/linux/linux_ipc.h"
 #include "platform/linux/linux_work_queues.h"
 #include "platform/linux/sandboxes_service.h"
 #include "testing/child_process.h"
 #include "testing/scratch_folder.h"
 
+#include <atomic>
 #include <chrono>
 #include <future>
 
@@ -26,10 +28,22 @@ constexpr const char* font = "/var/mobile/Library/UserFonts/FontFiles/org.exampl
 
 class NoIdentity : public CodeSigning {
 public:
-    std::optional<CodeSigningTask> taskFromAuditToken(const AuditToken&) override
+    std::optional<CodeSigningTask> taskFromAuditToken(const AuditToken& token) override
     {
-        return CodeSigningTask{};
+        return token == AuditToken{} ? std::nullopt : std::optional(task);
     }
+    CodeSigningTask task;
+};
+
+class DecidedSandbox : public Sandbox {
+public:
+    bool isSandboxed(const AuditToken& token) override { return isEverybody || token == AuditToken{}; }
+    bool mayRead(const AuditToken&, const std::string&) override { return false; }
+    std::optional<std::string> issueReadExtension(const AuditToken&, const std::string&) override
+    {
+        return std::nullopt;
+    }
+    std::atomic<bool> isEverybody = false;
 };
 
 Task<void> keepResults(std::shared_ptr<std::promise<CallResult>> promise, Arguments results)
@@ -53,12 +67,16 @@ struct IdentityServicesTest : ::testing::Test {
     const std::shared_ptr<FileAccessBroker> broker =
         std::make_shared<FileAccessBroker>(identity, tokens, folder.root, log);
     const std::shared_ptr<SandboxesService> sandboxes = std::make_shared<SandboxesService>(instances, log);
+    DecidedSandbox sandbox;
+    const std::shared_ptr<IdentitiesService> identities =
+        std::make_shared<IdentitiesService>(identity, sandbox, log);
 
     IdentityServicesTest()
     {
         std::filesystem::create_directories(folder.path + "/run/typhon");
         startFileAccessService(ipc, broker);
         startSandboxesService(ipc, sandboxes);
+        startIdentitiesService(ipc, identities);
     }
 
     CallResult call(const char* service, const InterfaceDescriptions& interfaces, const char* member,
@@ -93,6 +111,12 @@ struct IdentityServicesTest : ::testing::Test {
             std::make_shared<LinuxTransferredFile>(std::move(executable));
         return call(SandboxesService::serviceName, SandboxesService::interfaces(), "register",
                     {first, second});
+    }
+    CallResult identify(FileDescriptor process)
+    {
+        const std::shared_ptr<TransferredFile> file =
+            std::make_shared<LinuxTransferredFile>(std::move(process));
+        return call(IdentitiesService::serviceName, IdentitiesService::interfaces(), "identify", {file});
     }
     AuditToken me() const
     {
@@ -139,6 +163,41 @@ TEST_F(IdentityServicesTest, ASandboxIsRegistered)
     EXPECT_EQ(registerSandbox(openPidfd(first), executable()).error.name, ipc_errors::failed);
     EXPECT_EQ(registerSandbox(openPidfd(::getpid()), executable()).error.name, ipc_errors::invalidArguments);
     EXPECT_TRUE(log.has("may not register a sandbox"));
+}
+
+TEST_F(IdentityServicesTest, AServiceIsToldWhoItsCallerIs)
+{
+    identity.task = {.signingIdentifier = "org.example.a",
+                     .entitlements = {{"capabilities", PropertyList::Array{"one"}}}};
+    const auto result = identify(openPidfd(::getpid()));
+    ASSERT_TRUE(result.results) << result.error.message;
+    EXPECT_EQ(std::get<PropertyList>(result.results->at(0)),
+              PropertyList(PropertyList::Dictionary{{"identifier", "org.example.a"},
+                                                    {"entitlements", identity.task.entitlements},
+                                                    {"sandboxed", false},
+                                                    {"user", std::int64_t(::geteuid())}}));
+}
+
+TEST_F(IdentityServicesTest, AnUnsignedProgramHasNoIdentifier)
+{
+    const auto result = identify(openPidfd(::getpid()));
+    ASSERT_TRUE(result.results) << result.error.message;
+    EXPECT_EQ(std::get<PropertyList>(result.results->at(0)).find("identifier"), nullptr);
+}
+
+TEST_F(IdentityServicesTest, WhatIsNoProcessHasNoIdentity)
+{
+    EXPECT_EQ(identify(FileDescriptor(::open("/dev/null", O_RDONLY | O_CLOEXEC))).error.name,
+              ipc_errors::failed);
+    EXPECT_EQ(identify(FileDescriptor(::open("/proc/self", O_PATH | O_CLOEXEC))).error.name,
+              ipc_errors::failed);
+}
+
+TEST_F(IdentityServicesTest, ASandboxedProcessMayNotAskWhoOthersAre)
+{
+    sandbox.isEverybody = true;
+    EXPECT_EQ(identify(openPidfd(::getpid())).error.name, ipc_errors::accessDenied);
+    EXPECT_TRUE(log.has("may not ask who others are"));
 }
 
 }  // namespace

@@ -4,18 +4,24 @@
 #include "fontmanager/linux_user_font_manager.h"
 #include "platform/file_url.h"
 #include "platform/linux/linux_log.h"
+#include "platform/linux/listening_sockets.h"
 #include "platform/linux/property_list_writer.h"
 #include "platform/linux/scratch_directory.h"
 #include "platform/simulated/simulated_user_font_manager.h"
 
+#include <array>
 #include <chrono>
 #include <functional>
 #include <future>
 #include <memory>
 #include <string>
+#include <thread>
 #include <vector>
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/socket.h>
+#include <unistd.h>
 
 namespace typhon {
 namespace {
@@ -284,6 +290,30 @@ TEST(LinuxUserFontManagerTest, WithoutTheHelperOperationsEndWithAnError)
         EXPECT_NE(error.value_or("").find("does not run"), std::string::npos);
     }
     EXPECT_TRUE(isSynchronized);
+}
+
+TEST(LinuxUserFontManagerTest, AHelperThatEndsDuringACallMakesItFail)
+{
+    const ScratchDirectory scratch;
+    LinuxLog log{LogLevel::error, LinuxLog::Destination::descriptor, -1};
+    // Takes the connection, as a helper does, and ends before it answers.
+    auto listening = listenForService(RootDirectory(scratch.path()), "com.vorlan.Typhon.UserFontManager");
+    ASSERT_TRUE(listening.socket);
+    ASSERT_EQ(::fcntl(listening.socket.get(), F_SETFL, 0), 0);
+    std::thread dying([&] {
+        const FileDescriptor connection(::accept4(listening.socket.get(), nullptr, nullptr, SOCK_CLOEXEC));
+        std::array<char, 1> first{};
+        EXPECT_EQ(::read(connection.get(), first.data(), first.size()), 1);
+    });
+    std::promise<FontManagerError> promise;
+    LinuxUserFontManager manager(RootDirectory(scratch.path()), log, scratch.real("/no-helper"));
+    manager.enableOrDisablePersistentURLs({fileUrlFromPath(fontOfA)}, true, [&](FontManagerError error) {
+        promise.set_value(std::move(error));
+    });
+    auto outcome = promise.get_future();
+    dying.join();
+    ASSERT_EQ(outcome.wait_for(30s), std::future_status::ready);
+    EXPECT_NE(outcome.get(), std::nullopt);
 }
 
 const auto implementations = testing::Values(Implementation{"Simulated", std::make_unique<SimulatedSubject>},

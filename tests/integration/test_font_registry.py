@@ -1,11 +1,15 @@
 """The font-registry library with real processes: who may install fonts, and what others see of it."""
 
+import concurrent.futures
 import os
 import pathlib
 import plistlib
+import select
+import shutil
+import signal
 import unittest
 
-from scratch_system import BIN, FONT_FILES, REGISTRY, ScratchSystem
+from scratch_system import BIN, FONT_FILES, HELPER_SERVICE, PATIENCE, REGISTRY, ScratchSystem, eventually
 
 DEJAVU = pathlib.Path("/usr/share/fonts/truetype/dejavu")
 SANS = DEJAVU / "DejaVuSans.ttf"
@@ -89,6 +93,68 @@ class FontRegistry(unittest.TestCase):
         self.assertIn("bad.ttf: ", done.stderr.decode())
         self.assertEqual(registry_of(self.system), {})
         self.assertEqual(list(self.system.real(FONT_FILES).iterdir()), [])
+
+    def test_several_writers_at_once_never_lose_each_others_fonts(self):
+        fonts = sorted(DEJAVU.glob("*.ttf"))
+        with concurrent.futures.ThreadPoolExecutor(4) as pool:
+            calls = [pool.submit(self.system.ctl, "fonts", "install", "--identifier", f"org.example.{writer}", font)
+                     for font in fonts for writer in range(4)]
+            for call in calls:
+                call.result()
+        self.assertEqual(len(registry_of(self.system)), 4 * len(fonts))
+
+    def test_programs_that_need_the_helper_at_the_same_time_start_it_once(self):
+        self.system.kill_helper()
+        with concurrent.futures.ThreadPoolExecutor(6) as pool:
+            list(pool.map(lambda number: self.system.ctl(
+                "fonts", "install", "--identifier", f"org.example.{number}", SANS), range(6)))
+        self.assertEqual(len(registry_of(self.system)), 6)
+        log = self.system.real("/run/typhon/typhon-fontmanagerd.log").read_text()
+        self.assertNotIn("another process", log)
+
+    def test_a_call_fails_when_the_helper_is_killed_during_it(self):
+        pid = self.system.helper_pid()
+        # The daemon's own call, of its start.
+        eventually(lambda: not self.is_waiting_for(pid))
+        os.kill(pid, signal.SIGSTOP)
+        with concurrent.futures.ThreadPoolExecutor(1) as pool:
+            call = pool.submit(self.system.ctl, "fonts", "install", "--identifier", "org.example.a", SANS,
+                               check=False)
+            # It connects to the stopped helper's socket and waits; killed earlier it would start another one.
+            eventually(lambda: self.is_waiting_for(pid) or call.done())
+            self.system.kill_helper()
+            done = call.result()
+        self.assertEqual(done.returncode, 1)
+        self.assertIn("ended during the call", done.stderr.decode())
+        self.assertEqual(registry_of(self.system), {})
+
+    def is_waiting_for(self, helper):
+        """True when a connection waits to be accepted, or to be answered, by the stopped helper."""
+        path = str(self.system.socket_path(HELPER_SERVICE))
+        listing = pathlib.Path(f"/proc/{helper}/net/unix").read_text().splitlines()
+        # One line for the listening socket, one more for each connection to it.
+        return len([line for line in listing if line.endswith(path)]) > 1
+
+    def test_the_helper_goes_with_its_scratch_folder(self):
+        pidfd = os.pidfd_open(self.system.helper_pid())
+        self.system.daemon.kill()
+        shutil.rmtree(self.system.root)
+        readable, _, _ = select.select([pidfd], [], [], PATIENCE)
+        os.close(pidfd)
+        self.assertTrue(readable)
+        self.assertFalse(self.system.root.exists())
+
+    def test_profile_fonts_are_recorded_when_the_daemon_starts(self):
+        self.system.stop()
+        managed = self.system.real("/var/mobile/Library/Fonts/Managed")
+        managed.mkdir(parents=True)
+        (managed / "a.ttf").write_bytes(SANS.read_bytes())
+        (managed / "bad.ttf").write_bytes(b"garbage")
+        self.system.start()
+        record = self.system.real("/var/mobile/Library/UserFonts/ProfileFonts.plist")
+        eventually(record.exists)
+        self.assertEqual(plistlib.loads(record.read_bytes()),
+                         {"/var/mobile/Library/Fonts/Managed/a.ttf": {"familyName": {"DejaVuSans": "DejaVu Sans"}}})
 
 
 if __name__ == "__main__":
