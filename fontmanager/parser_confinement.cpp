@@ -137,7 +137,10 @@ void allowThreadOfSanitizer(SyscallFilter& filter)
 {
     constexpr uint32_t thread = CLONE_VM | CLONE_FS | CLONE_FILES | CLONE_SIGHAND | CLONE_THREAD;
     if (isSanitized) {
-        filter.allow(SYS_clone, {{0, Kind::hasAll, thread}}).refuse(SYS_clone3, ENOSYS);
+        filter.allow(SYS_clone, {{0, Kind::hasAll, thread}})
+            .refuse(SYS_clone3, ENOSYS)
+            .allow(SYS_gettimeofday)
+            .allow(SYS_clock_gettime);
     }
 }
 
