@@ -45,7 +45,10 @@ TyphonDaemon::TyphonDaemon(Platform& platform)
           {platform, userFontRegistry_, perClientFontInfo_, fontNameResolution_, issuedPathsLedger_}),
       fontChangeBroadcast_(platform, userFontRegistry_, perClientFontInfo_, notificationCenter_,
                            *mainHandlerQueue_),
-      scheduledFontDeletion_(std::make_shared<ScheduledFontDeletion>(platform, [] {}))
+      applicationRemoval_(
+          std::make_shared<ApplicationRemoval>(platform, issuedPathsLedger_, *mainHandlerQueue_)),
+      scheduledFontDeletion_(std::make_shared<ScheduledFontDeletion>(
+          platform, [removal = applicationRemoval_] { removal->sweepStrayEntries(); }))
 {}
 
 void TyphonDaemon::setupForSluiceService()
@@ -64,7 +67,7 @@ void TyphonDaemon::setupForScheduledFontDeletion()
 
 void TyphonDaemon::setupForDistributedNotifications()
 {
-    applicationRemoval_.setupForDistributedNotifications();
+    applicationRemoval_->setupForDistributedNotifications();
 }
 
 void TyphonDaemon::setupForAssetNotifications()

@@ -101,7 +101,7 @@ private:
     FontRequests fontRequests_;
     FontPickerRequests fontPickerRequests_;
     FontChangeBroadcast fontChangeBroadcast_;
-    ApplicationRemoval applicationRemoval_;
+    const std::shared_ptr<ApplicationRemoval> applicationRemoval_;
     const std::shared_ptr<ScheduledFontDeletion> scheduledFontDeletion_;
     AssetCatalogueEvents assetCatalogueEvents_;
     AssetDirectoryMonitoring assetDirectoryMonitoring_;

@@ -53,6 +53,9 @@ protected:
         Dictionary entry{{"familyName", Dictionary{{"Alpha-Regular", "Alpha"}}}};
         simulated.fileSystem.addFile(UserFontRegistry::path,
                                      Dictionary{{fontPath, entry}, {secondFontPath, entry}});
+        // What is not installed loses its fonts, and its record, at the start.
+        simulated.applicationRegistry.install({"com.example.provider", "1.0", false});
+        simulated.applicationRegistry.install({"com.example.app", "1.0", false});
     }
 
     AuditToken addProcess(const std::string& identifier, std::vector<std::string> userFonts)

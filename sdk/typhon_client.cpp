@@ -86,6 +86,11 @@ ClientResult<Done> TyphonClient::updatingUserFonts()
     return withoutResults(call(wire::updatingUserFonts, {}));
 }
 
+ClientResult<Done> TyphonClient::scheduleFontFilesDeletion(const std::vector<std::string>& paths)
+{
+    return withoutResults(call(wire::scheduleFontFilesDeletion, {arrayOfStrings(paths)}));
+}
+
 ClientResult<Done> TyphonClient::resetIssuedFontsFor(const std::string& identifier)
 {
     return withoutResults(call(wire::resetIssuedFontsFor, {PropertyList(identifier)}));

@@ -45,6 +45,9 @@ public:
     ClientResult<std::optional<PropertyList>> checkinForFontPicker();
     /// `updatingUserFonts:`. Returns when the daemon reads no registry any more: fonts may now be changed.
     ClientResult<Done> updatingUserFonts();
+    /// `scheduleFontFilesDeletion:`. Has font files deleted after the system's delay; paths outside the two
+    /// font trees are ignored. Returns when the daemon has taken the paths over, not when they are recorded.
+    ClientResult<Done> scheduleFontFilesDeletion(const std::vector<std::string>& paths);
     /// `resetIssuedFontsFor:reply:`. Forgets the fonts issued to an application. The answer does not tell
     /// whether this process was entitled to that.
     ClientResult<Done> resetIssuedFontsFor(const std::string& identifier);

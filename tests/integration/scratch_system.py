@@ -2,6 +2,7 @@
 
 import contextlib
 import ctypes
+import datetime
 import json
 import os
 import pathlib
@@ -163,10 +164,26 @@ class ScratchSystem:
         return self.ctl("sign", "--key", key, "--identifier", identifier, "--entitlements", document, path,
                         check=check)
 
+    # -- applications
+
+    def install_application(self, identifier):
+        """Makes the identifier an installed application's; whoever is none loses what the daemon keeps for it."""
+        path = self.real(f"/usr/share/applications/{identifier}.desktop")
+        path.parent.mkdir(parents=True, exist_ok=True)
+        path.write_text("[Desktop Entry]\nType=Application\nName=Sample\n")
+
+    def remove_application(self, identifier):
+        self.real(f"/usr/share/applications/{identifier}.desktop").unlink()
+
     # -- registry and preferences
 
     def write_registry(self, registry, format=plistlib.FMT_BINARY):
+        """Writes the registry; the providers it names are installed."""
         path = self.real(REGISTRY)
+        fonts = registry if isinstance(registry, dict) else ()
+        relative = [font[len(FONT_FILES) + 1:] for font in fonts if font.startswith(f"{FONT_FILES}/")]
+        for provider in {font.split("/")[0] for font in relative if "/" in font}:
+            self.install_application(provider)
         if isinstance(registry, bytes):
             path.write_bytes(registry)
         else:
@@ -181,6 +198,9 @@ class ScratchSystem:
         return logical
 
     def write_preferences(self, preferences):
+        """Writes the preferences; the clients that have a record in them are installed."""
+        for identifier in preferences.get("issues", ()):
+            self.install_application(identifier)
         self.real(PREFERENCES).write_bytes(plistlib.dumps(preferences, fmt=plistlib.FMT_BINARY))
 
     def preferences(self):
@@ -196,10 +216,10 @@ class ScratchSystem:
         self.daemon = Daemon(self, arguments, popen_options)
         for service in (SERVICE, f"{SERVICE}.file-access", f"{SERVICE}.sandboxes", f"{SERVICE}.identities",
                         HELPER_SERVICE):
-            self._wait_for_socket(self.socket_path(service))
+            self.wait_for_socket(self.socket_path(service))
         return self.daemon
 
-    def _wait_for_socket(self, path):
+    def wait_for_socket(self, path):
         deadline = time.monotonic() + PATIENCE
         while time.monotonic() < deadline:
             if self.daemon.process.poll() is not None:
@@ -260,6 +280,12 @@ def eventually(condition):
         if time.monotonic() > deadline:
             raise AssertionError("it never came to pass")
         time.sleep(0.01)
+
+
+def in_seconds(seconds):
+    """A date in a property list: so many seconds from now."""
+    now = datetime.datetime.now(datetime.timezone.utc).replace(tzinfo=None)
+    return now + datetime.timedelta(seconds=seconds)
 
 
 def entry(postscript, family, disabled=False, **more):

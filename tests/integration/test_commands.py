@@ -12,8 +12,8 @@ import unittest
 
 from scratch_system import BIN, FONT_FILES, ScratchSystem, entry
 
-COMMANDS = ("keygen", "trust", "sign", "run", "checkin", "open", "monitor", "ledger", "preferences", "plist", "fonts",
-            "applications", "post-notification")
+COMMANDS = ("keygen", "trust", "sign", "run", "checkin", "open", "monitor", "ledger", "deletions", "schedule-deletion",
+            "keep-provider", "preferences", "plist", "fonts", "applications", "post-notification")
 PATH = f"{FONT_FILES}/org.example.foundry/a.ttf"
 
 
@@ -54,7 +54,8 @@ class Commands(unittest.TestCase):
         self.assert_fails(2, "preferences", "set", "key", "x", "--type", "nonsense")
 
     def test_without_a_daemon_they_say_how_to_start_it(self):
-        for arguments in (["checkin"], ["open", PATH], ["monitor"], ["run", "--", "true"]):
+        for arguments in (["checkin"], ["open", PATH], ["monitor"], ["schedule-deletion", PATH],
+                          ["run", "--", "true"]):
             self.assertIn("Start typhond", self.assert_fails(1, *arguments))
 
     # -- keys and signatures
@@ -144,12 +145,48 @@ class Commands(unittest.TestCase):
         self.system.real("/var/mobile/Library/Preferences/com.vorlan.typhond.plist").write_bytes(b"garbage")
         self.assert_fails(1, "preferences", "get")
         self.assert_fails(1, "ledger")
+        self.assert_fails(1, "deletions")
 
     def test_the_ledger_gives_whole_paths(self):
         self.system.write_preferences({"issues": {"org.example.writer": ["U/x/a.ttf", "A/y/b.ttf", "/c.ttf"]}})
         self.assertEqual(self.json("ledger"), {"org.example.writer": [
             f"{FONT_FILES}/x/a.ttf", "/var/mobile/Library/UserFonts/FontAssets/y/b.ttf", "/c.ttf"]})
         self.assertIn(f"{FONT_FILES}/x/a.ttf", self.ctl("ledger").stdout.decode())
+
+    # -- deletions and providers
+
+    def test_deletions_shows_the_schedule_in_the_order_of_its_dates(self):
+        self.assertEqual(self.json("deletions"), {})
+        self.assertEqual(self.ctl("deletions").stdout, b"Nothing is scheduled for deletion.\n")
+        self.system.write_preferences({"delete": {
+            f"{PATH}1": datetime.datetime(2100, 1, 2), PATH: datetime.datetime(2000, 1, 1), f"{PATH}3": "never"}})
+        self.assertEqual(set(self.json("deletions")), {PATH, f"{PATH}1"})
+        lines = self.ctl("deletions").stdout.decode().splitlines()
+        self.assertEqual(lines[1].split(), ["2000-01-01T00:00:00Z", "overdue", PATH])
+        self.assertEqual(lines[2].split()[0], "2100-01-02T00:00:00Z")
+
+    def test_a_kept_provider_gets_a_desktop_entry_that_can_be_taken_away(self):
+        entry_file = self.system.real("/usr/local/share/applications/org.example.own.desktop")
+        self.ctl("keep-provider", "org.example.own")
+        self.ctl("keep-provider", "org.example.own")
+        text = entry_file.read_text()
+        self.assertIn("Type=Application\n", text)
+        self.assertIn("NoDisplay=true\n", text)
+        self.ctl("keep-provider", "--undo", "org.example.own")
+        self.assertFalse(entry_file.exists())
+        self.assert_fails(1, "keep-provider", "--undo", "org.example.own")
+
+    def test_a_programs_own_desktop_entry_is_left_alone(self):
+        entry_file = self.system.real("/usr/local/share/applications/org.example.own.desktop")
+        entry_file.parent.mkdir(parents=True)
+        entry_file.write_text("[Desktop Entry]\nType=Application\n")
+        self.assert_fails(1, "keep-provider", "org.example.own")
+        self.assert_fails(1, "keep-provider", "--undo", "org.example.own")
+        self.assertEqual(entry_file.read_text(), "[Desktop Entry]\nType=Application\n")
+
+    def test_an_identifier_that_is_no_file_name_cannot_be_kept(self):
+        for identifier in ("", "../org.example.own", ".hidden", "a/b", "new\nline", "x" * 300):
+            self.assert_fails(1, "keep-provider", "--", identifier)
 
     # -- registry and property lists
 

@@ -62,7 +62,8 @@ void addCommands(CLI::App& parser, Invocation& invocation)
 {
     for (const auto add :
          {addKeygenCommand, addTrustCommand, addSignCommand, addRunCommand, addCheckinCommand, addOpenCommand,
-          addMonitorCommand, addLedgerCommand, addPreferencesCommand, addPlistCommand, addFontsCommand,
+          addMonitorCommand, addLedgerCommand, addDeletionsCommand, addScheduleDeletionCommand,
+          addKeepProviderCommand, addPreferencesCommand, addPlistCommand, addFontsCommand,
           addApplicationsCommand, addPostNotificationCommand}) {
         add(parser, invocation);
     }
