@@ -107,6 +107,19 @@ std::optional<std::string> FontRegistration::add(const std::string& name, int fi
     return error ? std::optional(visibleText(name, 300) + ": " + *error) : std::nullopt;
 }
 
+std::optional<std::string> FontRegistration::flush()
+{
+    for (const auto& staged : fonts_) {
+        const FileDescriptor file(
+            ::openat(directory(), staged.temporary.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC));
+        if (!file || ::fdatasync(file.get()) != 0) {
+            const auto name = staged.font.path.substr(staged.font.path.rfind('/') + 1);
+            return visibleText(name, 300) + ": " + failure("flush its copy");
+        }
+    }
+    return std::nullopt;
+}
+
 std::optional<std::string> FontRegistration::stage(const std::string& name, int file)
 {
     StagedFont staged{.temporary =
@@ -146,7 +159,9 @@ std::optional<std::string> FontRegistration::copy(int from, int to)
             return failure("read it");
         }
         if (count == 0) {
-            return ::fdatasync(to) == 0 ? std::nullopt : std::optional(failure("flush its copy"));
+            // Not waited for: the disk is busy with it while the next file comes.
+            ::sync_file_range(to, 0, 0, SYNC_FILE_RANGE_WRITE);
+            return std::nullopt;
         }
         const auto bytes = count < 0 ? 0 : static_cast<std::size_t>(count);
         copied += bytes;

@@ -25,7 +25,7 @@ struct RegistrationLimits {
     std::uint64_t allBytes = std::uint64_t(4) << 30;
 };
 
-/// A file that was copied beside its place, flushed and read, and only needs to be renamed.
+/// A file that was copied beside its place and read, and only needs to be renamed.
 struct StagedFont {
     /// Its present name, in the directory of its path.
     std::string temporary;
@@ -46,10 +46,14 @@ public:
     FontRegistration& operator=(const FontRegistration&) = delete;
     ~FontRegistration();
 
-    /// Takes a file, to be installed under that name: copies and flushes it and reads the names of the copy.
+    /// Takes a file, to be installed under that name: copies it and reads the names of the copy.
     /// `file` may be anything that somebody passed; it stays the caller's and its offset is not used. Null,
     /// or why the file is refused, with its name; then the registration is of no use any more.
     std::optional<std::string> add(const std::string& name, int file);
+
+    /// Waits until all copies are on the disk, which is cheaper for all of them than for each. Null, or why
+    /// not.
+    std::optional<std::string> flush();
 
     const std::vector<StagedFont>& fonts() const { return fonts_; }
     /// Leaves the copies to whoever puts them in their places.

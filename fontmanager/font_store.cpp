@@ -99,6 +99,9 @@ FontStore::Beginning FontStore::begin(const std::string& identifier, bool enable
 
 RegistryChangeOutcome FontStore::commit(FontRegistration& registration)
 {
+    if (auto error = registration.flush()) {
+        return {.change = {}, .error = std::move(error)};
+    }
     const std::lock_guard lock(mutex_);
     auto interrupted = completeInterruptedChange();
     if (interrupted.error) {
