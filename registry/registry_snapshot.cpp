@@ -48,8 +48,7 @@ RegistrySnapshot::entriesWithAnyFamilyName(const std::vector<std::string>& names
         std::ranges::copy(entriesWithFamilyName(name), std::back_inserter(found));
     }
     std::ranges::sort(found, {}, &Entry::first);
-    const auto repeated = std::ranges::unique(found);
-    found.erase(repeated.begin(), repeated.end());
+    found.erase(std::unique(found.begin(), found.end()), found.end());
     return found;
 }
 

@@ -86,8 +86,7 @@ private:
     static void keepOneOfEach(Names& names)
     {
         std::ranges::sort(names);
-        const auto repeated = std::ranges::unique(names);
-        names.erase(repeated.begin(), repeated.end());
+        names.erase(std::unique(names.begin(), names.end()), names.end());
     }
 
     const RegistrySnapshot* registry_;
