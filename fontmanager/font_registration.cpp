@@ -24,6 +24,8 @@ namespace {
 
 constexpr mode_t filePermissions = 0644;
 constexpr std::size_t blockSize = 256 * 1024;
+constexpr std::size_t readingsAtOnce = 4;
+constexpr std::size_t longestShownName = 300;
 
 std::string failure(const std::string& what)
 {
@@ -104,17 +106,42 @@ std::optional<std::string> FontRegistration::add(const std::string& name, int fi
     if (!error) {
         error = stage(name, file);
     }
-    return error ? std::optional(visibleText(name, 300) + ": " + *error) : std::nullopt;
+    if (error) {
+        return visibleText(name, longestShownName) + ": " + *error;
+    }
+    return readings_.size() > readingsAtOnce ? takeNames() : std::nullopt;
 }
 
-std::optional<std::string> FontRegistration::flush()
+std::string FontRegistration::nameOf(const StagedFont& staged) const
 {
+    return visibleText(staged.font.path.substr(staged.font.path.rfind('/') + 1), longestShownName);
+}
+
+/// Waits for the oldest reading.
+std::optional<std::string> FontRegistration::takeNames()
+{
+    auto& staged = fonts_[readings_.front().font];
+    auto reading = readings_.front().names.get();
+    readings_.pop_front();
+    if (!reading.familyNames) {
+        return nameOf(staged) + ": " + reading.error;
+    }
+    staged.font.familyNames = std::move(*reading.familyNames);
+    return std::nullopt;
+}
+
+std::optional<std::string> FontRegistration::finish()
+{
+    while (!readings_.empty()) {
+        if (auto error = takeNames()) {
+            return error;
+        }
+    }
     for (const auto& staged : fonts_) {
         const FileDescriptor file(
             ::openat(directory(), staged.temporary.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC));
         if (!file || ::fdatasync(file.get()) != 0) {
-            const auto name = staged.font.path.substr(staged.font.path.rfind('/') + 1);
-            return visibleText(name, 300) + ": " + failure("flush its copy");
+            return nameOf(staged) + ": " + failure("flush its copy");
         }
     }
     return std::nullopt;
@@ -127,9 +154,8 @@ std::optional<std::string> FontRegistration::stage(const std::string& name, int 
                       .font = {.path = std::string(font_paths::fontFiles) + lease_->name() + "/" + name,
                                .familyNames = {},
                                .disabled = !enabled_}};
-    const FileDescriptor target(::openat(directory(), staged.temporary.c_str(),
-                                         O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC,
-                                         S_IRUSR | S_IWUSR));
+    FileDescriptor target(::openat(directory(), staged.temporary.c_str(),
+                                   O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, S_IRUSR | S_IWUSR));
     if (!target) {
         return failure("make its copy");
     }
@@ -141,11 +167,10 @@ std::optional<std::string> FontRegistration::stage(const std::string& name, int 
     if (auto error = copy(file, target.get())) {
         return error;
     }
-    auto names = readNames_(target.get());
-    if (!names.familyNames) {
-        return names.error;
-    }
-    fonts_.back().font.familyNames = std::move(*names.familyNames);
+    readings_.push_back(
+        {fonts_.size() - 1, std::async(std::launch::async, [this, copied = std::move(target)] {
+             return readNames_(copied.get());
+         })});
     return std::nullopt;
 }
 

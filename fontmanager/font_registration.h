@@ -6,7 +6,9 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <deque>
 #include <functional>
+#include <future>
 #include <memory>
 #include <optional>
 #include <set>
@@ -46,14 +48,15 @@ public:
     FontRegistration& operator=(const FontRegistration&) = delete;
     ~FontRegistration();
 
-    /// Takes a file, to be installed under that name: copies it and reads the names of the copy.
+    /// Takes a file, to be installed under that name: copies it, and begins to read the names of the copy.
     /// `file` may be anything that somebody passed; it stays the caller's and its offset is not used. Null,
-    /// or why the file is refused, with its name; then the registration is of no use any more.
+    /// or why this file or one before it is refused, with its name; then the registration is of no use any
+    /// more.
     std::optional<std::string> add(const std::string& name, int file);
 
-    /// Waits until all copies are on the disk, which is cheaper for all of them than for each. Null, or why
-    /// not.
-    std::optional<std::string> flush();
+    /// Waits until all names are read and all copies on the disk, where flushing all of them is cheaper than
+    /// each. Null, or why not, with the file's name. Before that the names in `fonts` are not there.
+    std::optional<std::string> finish();
 
     const std::vector<StagedFont>& fonts() const { return fonts_; }
     /// Leaves the copies to whoever puts them in their places.
@@ -61,6 +64,13 @@ public:
     int directory() const { return lease_->descriptor(); }
 
 private:
+    struct Reading {
+        std::size_t font = 0;
+        std::future<FontNamesReading> names;
+    };
+
+    std::optional<std::string> takeNames();
+    std::string nameOf(const StagedFont& staged) const;
     std::optional<std::string> stage(const std::string& name, int file);
     std::optional<std::string> copy(int from, int to);
 
@@ -72,6 +82,8 @@ private:
     std::vector<StagedFont> fonts_;
     std::set<std::string> names_;
     std::uint64_t bytes_ = 0;
+    /// Those under way, in order. Last: they end before what they use.
+    std::deque<Reading> readings_;
 };
 
 }  // namespace typhon

@@ -99,7 +99,7 @@ FontStore::Beginning FontStore::begin(const std::string& identifier, bool enable
 
 RegistryChangeOutcome FontStore::commit(FontRegistration& registration)
 {
-    if (auto error = registration.flush()) {
+    if (auto error = registration.finish()) {
         return {.change = {}, .error = std::move(error)};
     }
     const std::lock_guard lock(mutex_);
