@@ -174,20 +174,22 @@ Task<void> FontRegistrySession::addFontFile(Self self, AuditToken /*caller*/, Ca
 
 Task<void> FontRegistrySession::commitRegistration(Self self, AuditToken /*caller*/, Call call)
 {
-    const std::shared_ptr<FontRegistration> registration = std::move(self->registration_);
-    if (!registration) {
+    if (!self->registration_) {
         call->fail({ipc_errors::failed, "no registration is under way on this connection"});
         co_return;
     }
     std::vector<std::string> paths;
-    for (const auto& staged : registration->fonts()) {
+    for (const auto& staged : self->registration_->fonts()) {
         paths.push_back(staged.font.path);
     }
-    std::function<RegistryChangeOutcome(FontStore&)> work = [registration](FontStore& store) {
-        return registration->fonts().empty() ? RegistryChangeOutcome{} : store.commit(*registration);
+    std::function<RegistryChangeOutcome(FontStore&)> work = [self](FontStore& store) {
+        auto& registration = *self->registration_;
+        return registration.fonts().empty() ? RegistryChangeOutcome{} : store.commit(registration);
     };
     Task<RegistryChangeOutcome> changing = change(self, std::move(work));
     const auto outcome = co_await std::move(changing);
+    // Whoever is answered finds no copies any more.
+    self->registration_.reset();
     if (outcome.error) {
         call->fail({ipc_errors::failed, *outcome.error});
         co_return;
