@@ -3,6 +3,7 @@
 #include "platform/ipc.h"
 #include "protocol/wire.h"
 
+#include <functional>
 #include <optional>
 
 struct sd_bus_message;
@@ -18,6 +19,11 @@ public:
     std::optional<Arguments> argumentsOf(const wire::Operation& operation) const;
     /// Answers without results, unless no answer is expected.
     void reply() const;
+    /// Answers with the results that the operation gives, unless no answer is expected.
+    void reply(const wire::Operation& operation, const Arguments& results) const;
+    /// Answers without results when it is called, which may be after the call was handled. Dropped uncalled,
+    /// the peer never hears. For the thread of the connection.
+    std::function<void()> laterReply() const;
     /// Says that there is no such operation, or that it is not called like that.
     void refuse() const;
 
