@@ -45,13 +45,20 @@ void ReceivedChanges::remember(const FontChangeNotice& notice)
         }
     }
     const auto* fonts = notice.info ? notice.info->find("fontsInfo") : nullptr;
-    if (fonts != nullptr && fonts->asDictionary() != nullptr) {
-        for (const auto& [path, entry] : *fonts->asDictionary()) {
-            fonts_.insert_or_assign(path, entry);
-        }
+    if (fonts != nullptr) {
+        addFonts(*fonts);
     }
     if (const auto* extension = notice.info ? notice.info->find("extension.provider") : nullptr) {
         providerExtension_ = *extension;
+    }
+}
+
+void ReceivedChanges::addFonts(const PropertyList& fonts)
+{
+    if (fonts.asDictionary() != nullptr) {
+        for (const auto& [path, entry] : *fonts.asDictionary()) {
+            fonts_.insert_or_assign(path, entry);
+        }
     }
 }
 

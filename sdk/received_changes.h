@@ -23,6 +23,9 @@ public:
     /// How many went unread.
     std::size_t lost() const { return lost_; }
 
+    /// Takes grants for fonts, by path, that came by another way.
+    void addFonts(const PropertyList& fonts);
+
     /// What the changes added to the last check-in, in its form.
     PropertyList grants() const;
     void forgetGrants();

@@ -76,9 +76,20 @@ public:
     checkinForSilkpageProcess(const FileDescriptor& endpoint,
                               std::optional<std::chrono::milliseconds> timeout = std::nullopt);
 
+    /// `requestFonts:reply:`. Asks for the fonts of these names; the answer holds those that this process may
+    /// use, by path, and `openFont` opens them. The user may be asked, so it can take as long as that takes.
+    ClientResult<PropertyList> requestFonts(const std::vector<std::string>& families,
+                                            const std::vector<std::string>& postScriptNames);
+    /// `requestFonts:forClient:reply:`. For the font picker: has the daemon hand the fonts of a PostScript
+    /// name to the application behind that endpoint (see sdk/font_picker_client.h). True when the
+    /// application says that it uses them.
+    ClientResult<bool> requestFontsForClient(const std::string& postScriptName,
+                                             const FileDescriptor& endpoint);
+
     /// A read-only descriptor of the font file at the logical `path`, through the grant that the last
-    /// check-in, or a change since, gave. Fails with `accessDenied` for a file that was not granted, and with
-    /// `client_errors::expired` when the daemon was restarted since: check in again with a new client.
+    /// check-in, or a change or a request since, gave. Fails with `accessDenied` for a file that was not
+    /// granted, and with `client_errors::expired` when the daemon was restarted since: check in again with a
+    /// new client.
     ClientResult<FileDescriptor> openFont(const std::string& path);
     /// The same with a token of the caller's choice, empty for a file that needs none.
     ClientResult<FileDescriptor> redeem(const Data& token, const std::string& path);

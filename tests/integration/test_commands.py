@@ -13,7 +13,8 @@ import unittest
 from scratch_system import BIN, FONT_FILES, ScratchSystem, entry
 
 COMMANDS = ("keygen", "trust", "sign", "run", "checkin", "open", "monitor", "ledger", "deletions", "schedule-deletion",
-            "keep-provider", "preferences", "plist", "fonts", "applications", "post-notification")
+            "keep-provider", "preferences", "plist", "fonts", "request", "agent", "analytics",
+            "applications", "post-notification")
 PATH = f"{FONT_FILES}/org.example.foundry/a.ttf"
 
 

@@ -63,8 +63,8 @@ void addCommands(CLI::App& parser, Invocation& invocation)
     for (const auto add :
          {addKeygenCommand, addTrustCommand, addSignCommand, addRunCommand, addCheckinCommand, addOpenCommand,
           addMonitorCommand, addLedgerCommand, addDeletionsCommand, addScheduleDeletionCommand,
-          addKeepProviderCommand, addPreferencesCommand, addPlistCommand, addFontsCommand,
-          addApplicationsCommand, addPostNotificationCommand}) {
+          addKeepProviderCommand, addPreferencesCommand, addPlistCommand, addFontsCommand, addRequestCommand,
+          addAgentCommand, addAnalyticsCommand, addApplicationsCommand, addPostNotificationCommand}) {
         add(parser, invocation);
     }
 }

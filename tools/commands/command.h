@@ -68,6 +68,9 @@ void addKeepProviderCommand(CLI::App& parser, Invocation& invocation);
 void addPreferencesCommand(CLI::App& parser, Invocation& invocation);
 void addPlistCommand(CLI::App& parser, Invocation& invocation);
 void addFontsCommand(CLI::App& parser, Invocation& invocation);
+void addRequestCommand(CLI::App& parser, Invocation& invocation);
+void addAgentCommand(CLI::App& parser, Invocation& invocation);
+void addAnalyticsCommand(CLI::App& parser, Invocation& invocation);
 void addApplicationsCommand(CLI::App& parser, Invocation& invocation);
 void addPostNotificationCommand(CLI::App& parser, Invocation& invocation);
 
