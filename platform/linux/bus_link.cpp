@@ -24,6 +24,8 @@ namespace {
 
 const IpcError disconnectedError{ipc_errors::disconnected, "the connection is gone"};
 
+constexpr const char* noMessage = "it sent something that is no message";
+
 std::string errorText(int error)
 {
     return std::strerror(error < 0 ? -error : error);
@@ -46,7 +48,7 @@ const char* offenceOf(MessageReception::Outcome outcome)
     using Outcome = MessageReception::Outcome;
     switch (outcome) {
     case Outcome::malformed:
-        return "it sent something that is no message";
+        return noMessage;
     case Outcome::tooLarge:
         return "its message is too large";
     case Outcome::tooManyDescriptors:
@@ -209,9 +211,11 @@ void BusLink::processInput(Afterwards& afterwards)
 void BusLink::processReadyMessage(Afterwards& afterwards)
 {
     sd_bus_message* raw = nullptr;
-    const int result = sd_bus_process(bus_.get(), &raw);
+    const int result = bus_.readMessage(reception_.readySize(), &raw);
     const BusMessage message(raw);
-    if (result < 0 || sd_bus_is_open(bus_.get()) <= 0) {
+    if (result == -EBADMSG) {
+        punishLocked(noMessage, afterwards);
+    } else if (result < 0 || sd_bus_is_open(bus_.get()) <= 0) {
         abandonLocked(errorText(result), afterwards);
     } else if (message) {
         receive(message.get(), afterwards);
@@ -225,7 +229,7 @@ void BusLink::processAssembledMessage(Afterwards& afterwards)
     if (auto* message = decoder.decode(reception_.take())) {
         receive(message, afterwards);
     } else {
-        punishLocked("it sent something that is no message", afterwards);
+        punishLocked(noMessage, afterwards);
     }
 }
 

@@ -20,6 +20,8 @@ public:
     sd_bus_message* decode(ReceivedMessage received);
 
 private:
+    static bool isSafe(ReceivedMessage& received);
+    sd_bus_message* feed(ReceivedMessage& received);
     static int keep(sd_bus_message* message, void* decoder, sd_bus_error* error);
     bool sendSome(std::span<const std::uint8_t>& bytes, const std::vector<FileDescriptor>& descriptors);
 

@@ -35,7 +35,8 @@ std::uint32_t number(Bytes header, std::size_t offset)
 
 bool isWellFormed(Bytes header)
 {
-    return (header[0] == 'l' || header[0] == 'B') && header[3] == 1;
+    // Every message has fields; with none sd-bus would look for them behind its end.
+    return (header[0] == 'l' || header[0] == 'B') && header[3] == 1 && number(header, 12) > 0;
 }
 
 /// Fixed header, padded header fields, body.
@@ -52,11 +53,20 @@ std::span<std::uint8_t> scratch()
     return bytes;
 }
 
-/// Without room for descriptors: those stay with the message. It ends behind the first bytes that come with
-/// some.
-ssize_t peek(int socket, std::size_t size)
+struct Look {
+    ssize_t bytes;
+    bool descriptors;
+};
+
+/// Without room for descriptors: those stay where they are, and are only noticed.
+Look peek(int socket, std::size_t size)
 {
-    return ::recv(socket, scratch().data(), size, MSG_PEEK | MSG_DONTWAIT);
+    iovec part{scratch().data(), size};
+    msghdr message{};
+    message.msg_iov = &part;
+    message.msg_iovlen = 1;
+    const auto bytes = ::recvmsg(socket, &message, MSG_PEEK | MSG_DONTWAIT);
+    return {bytes, (message.msg_flags & MSG_CTRUNC) != 0};
 }
 
 bool isTransient(int error)
@@ -80,11 +90,11 @@ MessageReception::Outcome MessageReception::next(int socket)
 
 MessageReception::Outcome MessageReception::look(int socket)
 {
-    auto waiting = peek(socket, smallLook);
+    auto [waiting, descriptors] = peek(socket, smallLook);
     if (waiting <= 0) {
         return waiting < 0 && isTransient(errno) ? Outcome::nothing : Outcome::closed;
     }
-    if (static_cast<std::size_t>(waiting) < headerSize) {
+    if (static_cast<std::size_t>(waiting) < headerSize || descriptors) {
         return Outcome::begun;
     }
     const Bytes header = scratch().first(headerSize);
@@ -96,9 +106,12 @@ MessageReception::Outcome MessageReception::look(int socket)
         return Outcome::tooLarge;
     }
     if (static_cast<std::size_t>(waiting) < size && size <= largeLook) {
-        waiting = peek(socket, size);
+        const auto larger = peek(socket, size);
+        waiting = larger.bytes;
+        descriptors = larger.descriptors;
     }
-    return std::cmp_greater_equal(waiting, size) ? Outcome::ready : Outcome::begun;
+    readySize_ = size;
+    return std::cmp_greater_equal(waiting, size) && !descriptors ? Outcome::ready : Outcome::begun;
 }
 
 MessageReception::Outcome MessageReception::assemble(int socket)

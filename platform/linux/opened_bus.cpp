@@ -1,9 +1,12 @@
 #include "platform/linux/opened_bus.h"
 
 #include <cerrno>
+#include <cstdint>
 #include <string_view>
 
 #include <fcntl.h>
+#include <linux/sockios.h>
+#include <sys/ioctl.h>
 #include <sys/socket.h>
 
 namespace typhon {
@@ -23,6 +26,12 @@ bool makePair(FileDescriptor& first, FileDescriptor& second)
     first = FileDescriptor(pair[0]);
     second = FileDescriptor(pair[1]);
     return true;
+}
+
+std::size_t waitingBytes(int socket)
+{
+    int waiting = 0;
+    return ::ioctl(socket, SIOCINQ, &waiting) == 0 ? static_cast<std::size_t>(waiting) : 0;
 }
 
 }  // namespace
@@ -79,7 +88,31 @@ int OpenedBus::moveOnto(FileDescriptor socket)
         return -errno;
     }
     far_ = FileDescriptor();
+    return sd_bus_add_filter(bus_.get(), nullptr, sawMessage, this);
+}
+
+int OpenedBus::sawMessage(sd_bus_message*, void* bus, sd_bus_error*)
+{
+    static_cast<OpenedBus*>(bus)->sawMessage_ = true;
     return 0;
+}
+
+int OpenedBus::readMessage(std::size_t size, sd_bus_message** message)
+{
+    std::uint64_t queuedBefore = 0;
+    std::uint64_t queuedAfter = 0;
+    sd_bus_get_n_queued_write(bus_.get(), &queuedBefore);
+    const auto before = waitingBytes(output_);
+    sawMessage_ = false;
+    const int result = sd_bus_process(bus_.get(), message);
+    if (result < 0) {
+        return result;
+    }
+    sd_bus_get_n_queued_write(bus_.get(), &queuedAfter);
+    if (!sawMessage_) {
+        return queuedAfter < queuedBefore ? 0 : -EBADMSG;
+    }
+    return waitingBytes(output_) + size < before ? -EBADMSG : 1;
 }
 
 int OpenedBus::writeOnly(const IdleSocket& idle)

@@ -2,6 +2,7 @@
 
 #include "platform/linux/file_descriptor.h"
 
+#include <cstddef>
 #include <memory>
 
 #include <systemd/sd-bus.h>
@@ -30,10 +31,17 @@ private:
 class OpenedBus {
 public:
     OpenedBus() = default;
+    OpenedBus(const OpenedBus&) = delete;
+    OpenedBus& operator=(const OpenedBus&) = delete;
     /// A negative errno when it cannot be made.
     int open(bool withDescriptors);
     /// Replaces the sockets of our own by `socket`, which does not block. A negative errno on failure.
     int moveOnto(FileDescriptor socket);
+    /// Reads the one message of `size` bytes that lies in the socket: a positive number when it was read, and
+    /// `message` is it, unless sd-bus has dealt with it alone; zero when it had to write first. A negative
+    /// errno when the bus is of no more use: what was read was no message, and sd-bus, which passes over such
+    /// bytes in silence and goes on behind them, may have read more than it should.
+    int readMessage(std::size_t size, sd_bus_message** message);
     /// Writes as much as the peer takes of what waits, and reads nothing meanwhile. Returns as
     /// `sd_bus_process`.
     int writeOnly(const IdleSocket& idle);
@@ -47,12 +55,14 @@ public:
 
 private:
     int begin(bool withDescriptors);
+    static int sawMessage(sd_bus_message* message, void* bus, sd_bus_error* error);
 
     std::unique_ptr<sd_bus, SdBusClose> bus_;
     FileDescriptor far_;
     // Owned by the bus.
     int input_ = -1;
     int output_ = -1;
+    bool sawMessage_ = false;
 };
 
 }  // namespace typhon

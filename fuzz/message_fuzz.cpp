@@ -1,0 +1,188 @@
+// Any bytes as what a peer sends after the handshake, with descriptors: once all there at once, so that
+// sd-bus reads them from the socket, and once in pieces, which are put together. Both must come to the same
+// end, and the arguments are read with the types that the message claims.
+
+#include "platform/linux/bus_message.h"
+#include "platform/linux/bus_message_codec.h"
+#include "platform/linux/memory_file.h"
+#include "platform/linux/message_decoder.h"
+#include "platform/linux/message_reception.h"
+#include "platform/linux/opened_bus.h"
+#include "platform/linux/property_list_writer.h"
+#include "require.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include <sys/socket.h>
+
+namespace typhon {
+namespace {
+
+using Outcome = MessageReception::Outcome;
+
+constexpr std::size_t largestMessage = 64U << 10;
+
+MessageLimits limits()
+{
+    MessageLimits result;
+    result.values = 4096;
+    result.depth = 16;
+    result.bytes = largestMessage;
+    result.descriptors = 2;
+    result.memoryFileBytes = 64U << 10;
+    return result;
+}
+
+bool sendPiece(int socket, std::string_view bytes, unsigned descriptors)
+{
+    static const auto file =
+        sealedMemoryFile(writeBinaryPropertyList(PropertyList(PropertyList::Dictionary{{"key", "value"}})));
+    iovec part{const_cast<char*>(bytes.data()), bytes.size()};
+    alignas(cmsghdr) char control[CMSG_SPACE(3 * sizeof(int))];
+    msghdr message{};
+    message.msg_iov = &part;
+    message.msg_iovlen = 1;
+    if (descriptors > 0) {
+        message.msg_control = control;
+        message.msg_controllen = CMSG_SPACE(descriptors * sizeof(int));
+        auto* rights = CMSG_FIRSTHDR(&message);
+        rights->cmsg_level = SOL_SOCKET;
+        rights->cmsg_type = SCM_RIGHTS;
+        rights->cmsg_len = CMSG_LEN(descriptors * sizeof(int));
+        const int copies[] = {file.get(), file.get(), file.get()};
+        std::memcpy(CMSG_DATA(rights), copies, descriptors * sizeof(int));
+    }
+    return ::sendmsg(socket, &message, MSG_DONTWAIT | MSG_NOSIGNAL) == static_cast<ssize_t>(bytes.size());
+}
+
+/// What became of the messages: the number of those that were understood, how it ended, and their arguments.
+struct Reception {
+    std::vector<std::string> messages;
+    bool refused = false;
+    bool operator==(const Reception&) const = default;
+};
+
+std::string describe(sd_bus_message* message)
+{
+    const char* member = sd_bus_message_get_member(message);
+    const char* signature = sd_bus_message_get_signature(message, 1);
+    require(signature != nullptr, "a message has a signature");
+    const auto reading = readMessage(message, signature, AuditToken{}, limits());
+    require(reading.memory <= 4 * limits().memoryFileBytes + 96 * limits().values + limits().bytes,
+            "the memory of arguments is bounded");
+    return std::string(member == nullptr ? "" : member) + " " + signature +
+           (reading.arguments ? " read" : "");
+}
+
+class Peer {
+public:
+    Peer() : reception_({largestMessage, 3}, std::make_unique<HeldBytes::Claim>(held(), AuditToken{}))
+    {
+        require(bus_.open(true) >= 0, "a bus opens");
+        int pair[2];
+        require(::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0, pair) == 0, "sockets");
+        far_ = FileDescriptor(pair[0]);
+        require(bus_.moveOnto(FileDescriptor(pair[1])) >= 0, "and moves");
+        require(sd_bus_add_filter(bus_.get(), nullptr, keep, this) >= 0, "and is listened to");
+    }
+
+    int farEnd() const { return far_.get(); }
+    Reception result;
+
+    /// Reads until there is nothing more.
+    void read()
+    {
+        while (!result.refused && readOne()) {
+        }
+    }
+
+private:
+    static std::shared_ptr<HeldBytes> held()
+    {
+        static const auto bytes = std::make_shared<HeldBytes>(1U << 20, 1U << 20);
+        return bytes;
+    }
+    static int keep(sd_bus_message* message, void* peer, sd_bus_error*)
+    {
+        static_cast<Peer*>(peer)->last_.reset(sd_bus_message_ref(message));
+        return 0;
+    }
+    bool readReady()
+    {
+        sd_bus_message* raw = nullptr;
+        const int got = bus_.readMessage(reception_.readySize(), &raw);
+        const BusMessage message(raw);
+        result.refused = got < 0;
+        if (got > 0) {
+            require(last_ != nullptr, "a message was seen");
+            result.messages.push_back(describe(last_.get()));
+        }
+        last_.reset();
+        return true;
+    }
+    bool readOne()
+    {
+        switch (reception_.next(bus_.socket())) {
+        case Outcome::ready:
+            return readReady();
+        case Outcome::assembled: {
+            MessageDecoder decoder;
+            auto* message = decoder.decode(reception_.take());
+            result.refused = message == nullptr;
+            if (message != nullptr) {
+                result.messages.push_back(describe(message));
+            }
+            return true;
+        }
+        case Outcome::nothing:
+        case Outcome::begun:
+            return false;
+        default:
+            result.refused = true;
+            return true;
+        }
+    }
+
+    OpenedBus bus_;
+    FileDescriptor far_;
+    MessageReception reception_;
+    BusMessage last_;
+};
+
+void check(std::string_view input)
+{
+    if (input.size() < 2 || input.size() > largestMessage) {
+        return;
+    }
+    const auto descriptors = static_cast<unsigned char>(input[0]) % 4u;
+    const auto piece = 1U + static_cast<unsigned char>(input[1]);
+    const auto bytes = input.substr(2);
+    Peer whole;
+    Peer cut;
+    if (bytes.empty() || !sendPiece(whole.farEnd(), bytes, descriptors)) {
+        return;
+    }
+    whole.read();
+    for (std::size_t at = 0; at < bytes.size() && !cut.result.refused; at += piece) {
+        if (!sendPiece(cut.farEnd(), bytes.substr(at, piece), at == 0 ? descriptors : 0)) {
+            return;
+        }
+        cut.read();
+    }
+    require(whole.result == cut.result, "how the bytes are cut makes no difference");
+}
+
+}  // namespace
+}  // namespace typhon
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size)
+{
+    typhon::check({reinterpret_cast<const char*>(data), size});
+    return 0;
+}
