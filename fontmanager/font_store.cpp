@@ -91,10 +91,11 @@ FontStore::Beginning FontStore::begin(const std::string& identifier, bool enable
     if (!opening.lease) {
         return {nullptr, std::move(opening.error)};
     }
+    Beginning beginning;
     const std::lock_guard lock(mutex_);
-    return {
-        std::make_unique<FontRegistration>(std::move(opening.lease), enabled, ++serial_, readNames_, limits_),
-        std::nullopt};
+    beginning.registration =
+        std::make_unique<FontRegistration>(std::move(opening.lease), enabled, ++serial_, readNames_, limits_);
+    return beginning;
 }
 
 RegistryChangeOutcome FontStore::commit(FontRegistration& registration)

@@ -172,6 +172,7 @@ TEST_F(FontStoreTest, AMalformedRegistryIsNotTouchedAndNothingIsInstalled)
 TEST_F(FontStoreTest, ConcurrentRegistrationsNeverLoseEachOthersEntries)
 {
     std::vector<std::thread> threads;
+    threads.reserve(4);
     for (int thread = 0; thread < 4; ++thread) {
         threads.emplace_back([this, thread] {
             for (int n = 0; n < 10; ++n) {

@@ -71,6 +71,7 @@ FileDescriptor startDetached(const std::string& program, const RootDirectory& ro
         words.insert(words.end(), {"--root", root.directory()});
     }
     std::vector<char*> arguments;
+    arguments.reserve(words.size() + 1);
     for (auto& word : words) {
         arguments.push_back(word.data());
     }

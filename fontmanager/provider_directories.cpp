@@ -80,7 +80,9 @@ ProviderDirectories::Opening ProviderDirectories::open(const std::string& name, 
         return {nullptr, failure("open", name)};
     }
     ++leases_[name];
-    return {std::make_unique<Lease>(*this, name, std::move(directory)), std::nullopt};
+    Opening opening;
+    opening.lease = std::make_unique<Lease>(*this, name, std::move(directory));
+    return opening;
 }
 
 void ProviderDirectories::leave(const std::string& name)

@@ -17,7 +17,6 @@ namespace {
 using namespace test_service;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
-using ::testing::IsEmpty;
 
 const std::string own = std::string(font_paths::fontFiles) + "org.example.a/";
 
@@ -151,6 +150,7 @@ TEST_F(FontRegistryServiceTest, MembersOutOfOrderAreErrors)
 TEST_F(FontRegistryServiceTest, ManyWritersAtOnceLoseNothing)
 {
     std::vector<std::thread> writers;
+    writers.reserve(4);
     for (int writer = 0; writer < 4; ++writer) {
         writers.emplace_back([this, writer] {
             auto admin = client();
