@@ -29,6 +29,8 @@ constexpr const char* usage = R"(A sample application of typhon.
   reset IDENTIFIER  ask the daemon to forget the fonts issued to an application
   monitor           say what it is told of each change of fonts, a line each, and read what came
   monitor COUNT     the same, and end after so many changes
+  request [--family NAME]... [--postscript NAME]...
+                    ask for fonts by name, and read those that it was given
   content           start a web-content process of its own and pass its fonts on to it
 
 The system is that of the folder $TYPHON_ROOT, else of this machine.
@@ -62,8 +64,6 @@ PropertyList::Dictionary fontsIn(const PropertyList& view)
                                                                 : *fonts->asDictionary();
 }
 
-namespace {
-
 void printFont(const std::string& path, const PropertyList& entry)
 {
     const char* token = entry.find("data") == nullptr ? "" : "  [own token]";
@@ -75,6 +75,8 @@ void printFont(const std::string& path, const PropertyList& entry)
                   << visibleText(postScriptName) << "  " << visibleText(path) << token << "\n";
     }
 }
+
+namespace {
 
 void printExtensions(const PropertyList& view)
 {
@@ -110,7 +112,8 @@ int showCheckin(TyphonClient& client)
     return 0;
 }
 
-/// True when the file could be opened and is a font.
+}  // namespace
+
 bool readFont(TyphonClient& client, const std::string& path)
 {
     const auto file = client.openFont(path);
@@ -125,6 +128,8 @@ bool readFont(TyphonClient& client, const std::string& path)
     }
     return !faces.empty();
 }
+
+namespace {
 
 int readFonts(TyphonClient& client)
 {
@@ -250,7 +255,7 @@ int runCommand(const std::vector<std::string>& words)
         return removeFonts();
     }
     if (!is("checkin", 1) && !is("read", 1) && !is("try", 2) && !is("reset", 2) && !is("monitor", 1) &&
-        !is("monitor", 2) && !is("content", 1)) {
+        !is("monitor", 2) && !is("content", 1) && (words.empty() || words.front() != "request")) {
         std::cerr << usage;
         return 2;
     }
@@ -266,6 +271,9 @@ int runCommand(const std::vector<std::string>& words)
     }
     if (words.front() == "monitor") {
         return monitor(*client, words.size() == 2 ? std::strtoul(words[1].c_str(), nullptr, 10) : 0);
+    }
+    if (words.front() == "request") {
+        return requestFonts(*client, {words.begin() + 1, words.end()});
     }
     if (words.front() == "content") {
         return showContent(*client);

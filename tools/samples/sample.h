@@ -4,7 +4,9 @@
 
 #include <cstddef>
 #include <optional>
+#include <string>
 #include <string_view>
+#include <vector>
 
 namespace typhon::sample {
 
@@ -19,6 +21,13 @@ int complain(const ClientError& error);
 ClientResult<View> checkIn(TyphonClient& client);
 /// The fonts that came with a check-in or a change, by path.
 PropertyList::Dictionary fontsIn(const PropertyList& view);
+
+void printFont(const std::string& path, const PropertyList& entry);
+/// Opens a font through its grant and prints the names in it. True when it could be opened and is a font.
+bool readFont(TyphonClient& client, const std::string& path);
+
+/// Asks for the fonts of names, given as options, and reads those that come.
+int requestFonts(TyphonClient& client, const std::vector<std::string>& words);
 
 /// Prints every change of fonts that it is told of, and reads what came. Ends after `count`, if above zero.
 int monitor(TyphonClient& client, unsigned long count);
