@@ -48,7 +48,9 @@ struct Parcel {
     msghdr message{};
 };
 
-bool sendDescriptor(const FileDescriptor& socket, int descriptor)
+}  // namespace
+
+bool sendDescriptor(int socket, int descriptor)
 {
     Parcel parcel;
     auto* header = CMSG_FIRSTHDR(&parcel.message);
@@ -56,8 +58,10 @@ bool sendDescriptor(const FileDescriptor& socket, int descriptor)
     header->cmsg_type = SCM_RIGHTS;
     header->cmsg_len = CMSG_LEN(sizeof descriptor);
     std::memcpy(CMSG_DATA(header), &descriptor, sizeof descriptor);
-    return ::sendmsg(socket.get(), &parcel.message, MSG_NOSIGNAL) == 1;
+    return ::sendmsg(socket, &parcel.message, MSG_NOSIGNAL) == 1;
 }
+
+namespace {
 
 FileDescriptor receiveDescriptor(const FileDescriptor& socket)
 {
@@ -79,7 +83,7 @@ int runContent(const FileDescriptor& host)
     if (!content) {
         return complain(content.error());
     }
-    if (!sendDescriptor(host, content->endpoint().get())) {
+    if (!sendDescriptor(host.get(), content->endpoint().get())) {
         return 1;
     }
     const auto fonts = content->waitForFonts();

@@ -31,6 +31,8 @@ constexpr const char* usage = R"(A sample application of typhon.
   monitor COUNT     the same, and end after so many changes
   request [--family NAME]... [--postscript NAME]...
                     ask for fonts by name, and read those that it was given
+  picked            make an endpoint, send it over standard input (a socket), and read what the font picker
+                    hands to it
   content           start a web-content process of its own and pass its fonts on to it
 
 The system is that of the folder $TYPHON_ROOT, else of this machine.
@@ -250,6 +252,9 @@ int runCommand(const std::vector<std::string>& words)
     }
     if (words.size() > 1 && words.front() == "install") {
         return installFonts({words.begin() + 1, words.end()});
+    }
+    if (is("picked", 1)) {
+        return receivePicked();
     }
     if (is("remove", 1)) {
         return removeFonts();

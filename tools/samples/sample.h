@@ -29,6 +29,13 @@ bool readFont(TyphonClient& client, const std::string& path);
 /// Asks for the fonts of names, given as options, and reads those that come.
 int requestFonts(TyphonClient& client, const std::vector<std::string>& words);
 
+/// Makes an endpoint for the font picker, passes it on over the socket that standard input is, and reads the
+/// fonts that were picked.
+int receivePicked();
+
+/// Passes a descriptor on over a Unix socket.
+bool sendDescriptor(int socket, int descriptor);
+
 /// Prints every change of fonts that it is told of, and reads what came. Ends after `count`, if above zero.
 int monitor(TyphonClient& client, unsigned long count);
 
