@@ -142,6 +142,9 @@ protected:
         EXPECT_EQ(handler->webcontentProcessConnections(), std::nullopt);
     }
 
+    // Before the platform: calls that are still pending fail while it ends, and the failures are noted here.
+    int replies = 0;
+    std::vector<std::string> errors;
     SimulatedPlatform simulated;
     std::shared_ptr<TyphonDaemon> daemon = std::make_shared<TyphonDaemon>(simulated.platform);
     AuditToken hostToken;
@@ -149,8 +152,6 @@ protected:
     std::shared_ptr<TyphonHandler> handler;
     std::size_t issuedBefore = 0;
     std::size_t connectionsBefore = 0;
-    int replies = 0;
-    std::vector<std::string> errors;
 };
 
 TEST_F(WebContentTest, AContentProcessGetsTheHostsFontsWithGrantsOfItsOwn)
