@@ -71,7 +71,7 @@ ClientResult<bool> FontPickerClient::waitForFonts(const Activate& activate,
         if (hasFonts) {
             return true;
         }
-        const auto waited = waitFor(parts_->listener.descriptors(), deadline);
+        auto waited = waitFor(parts_->listener.descriptors(), deadline);
         if (!waited || !*waited) {
             return waited;
         }

@@ -109,7 +109,7 @@ std::string displayText(std::string_view text, std::size_t width)
 {
     // A name may be a megabyte long; what can be seen of it is not.
     const std::size_t enough = width * 16 + 64;
-    const auto whole = harmless(visibleText(text.substr(0, enough)));
+    auto whole = harmless(visibleText(text.substr(0, enough)));
     if (displayWidth(whole) <= width && text.size() <= enough) {
         return whole;
     }

@@ -31,6 +31,7 @@ int becomeAgent(const Invocation& invocation, const Options& options)
         words.insert(words.end(), {"--root", invocation.root().directory()});
     }
     std::vector<char*> arguments;
+    arguments.reserve(words.size() + 1);
     for (auto& word : words) {
         arguments.push_back(word.data());
     }
