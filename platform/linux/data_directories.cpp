@@ -1,6 +1,7 @@
 #include "platform/linux/data_directories.h"
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <filesystem>
 #include <mutex>
@@ -20,7 +21,8 @@ namespace {
 
 constexpr std::size_t mostUsers = 10'000;
 constexpr uid_t firstUser = 1000;
-constexpr const char* userData = ".local/share";
+/// What a user installed in a user's own way, and what flatpak exports for that user.
+constexpr std::array usersData = {".local/share", ".local/share/flatpak/exports/share"};
 
 std::uint64_t resolutionFor(const DataDirectory& directory)
 {
@@ -99,7 +101,9 @@ std::vector<DataDirectory> dataDirectories(const RootDirectory& root)
         directories.push_back({.base = root.real(path), .below = {}, .isUsers = false});
     }
     for (const auto& home : root.isScratch() ? homesBelow(root.real("/home")) : homesOfUsers()) {
-        directories.push_back({.base = home, .below = userData, .isUsers = true});
+        for (const char* below : usersData) {
+            directories.push_back({.base = home, .below = below, .isUsers = true});
+        }
     }
     return directories;
 }

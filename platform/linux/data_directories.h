@@ -29,7 +29,8 @@ struct DataDirectory {
 };
 
 /// All data directories: those of the system first, in the order in which they are asked, then those of the
-/// users with a home directory. Under a scratch root, homes are the folders in its /home.
+/// users with a home directory, each user's own before that user's flatpaks. Under a scratch root, homes are
+/// the folders in its /home.
 std::vector<DataDirectory> dataDirectories(const RootDirectory& root);
 
 /// Changes when the set of users does.

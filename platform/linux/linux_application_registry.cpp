@@ -77,7 +77,7 @@ void LinuxApplicationRegistry::refresh()
     for (auto& source : sources_) {
         const auto complaint = source.applications.refresh();
         if (complaint && complaint != source.complaint) {
-            TYLog_Error(log_, "installed applications in " + source.where.base + ": " + *complaint);
+            TYLog_Error(log_, "installed applications in " + source.where.path() + ": " + *complaint);
         }
         source.complaint = complaint;
     }
@@ -92,8 +92,8 @@ void LinuxApplicationRegistry::refreshDirectories()
     }
     std::vector<Source> sources;
     for (auto& where : dataDirectories(root_)) {
-        const auto known = std::ranges::find(
-            sources_, where.base, [](const Source& source) -> const auto& { return source.where.base; });
+        const auto known = std::ranges::find(sources_, where.path(),
+                                             [](const Source& source) { return source.where.path(); });
         if (known != sources_.end()) {
             sources.push_back(std::move(*known));
         } else {

@@ -3,6 +3,7 @@
 
 #include <filesystem>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -46,8 +47,9 @@ protected:
 TEST_F(LinuxApplicationRegistryTest, FindsApplicationsInEveryDataDirectory)
 {
     int number = 0;
-    for (const std::string data : {"/usr/share", "/usr/local/share", "/var/lib/flatpak/exports/share",
-                                   "/home/ada/.local/share", "/home/bob/.local/share"}) {
+    for (const std::string data :
+         {"/usr/share", "/usr/local/share", "/var/lib/flatpak/exports/share", "/home/ada/.local/share",
+          "/home/bob/.local/share", "/home/bob/.local/share/flatpak/exports/share"}) {
         const auto identifier = "com.example.app" + std::to_string(number++);
         EXPECT_FALSE(isInstalled(identifier)) << data;
         scratch.writeFile(data + "/applications/" + identifier + ".desktop", entryText);
@@ -120,6 +122,31 @@ TEST_F(LinuxApplicationRegistryTest, WhatTheAdministratorInstalledComesFirst)
     scratch.writeFile("/usr/share/applications/a.b.desktop", entryText);
     scratch.writeFile("/usr/share/metainfo/a.b.metainfo.xml", metadataText("a.b", "1"));
     EXPECT_EQ(version("a.b"), "1");
+}
+
+TEST_F(LinuxApplicationRegistryTest, AUsersFlatpaksAreLinksIntoThatUsersInstallation)
+{
+    const std::string flatpak = "/home/ada/.local/share/flatpak";
+    const std::string entry = "applications/org.example.letters.desktop";
+    const std::string exported = "app/org.example.letters/current/active/export/share/";
+    scratch.writeFile(flatpak + "/" + exported + entry, entryText);
+    std::filesystem::create_directories(scratch.real(flatpak + "/exports/share/applications"));
+    std::filesystem::create_symlink("../../../" + exported + entry,
+                                    scratch.real(flatpak + "/exports/share/" + entry));
+    EXPECT_EQ(version("org.example.letters"), std::nullopt);
+    std::filesystem::remove_all(scratch.real(flatpak + "/app"));
+    EXPECT_FALSE(isInstalled("org.example.letters"));
+}
+
+TEST_F(LinuxApplicationRegistryTest, WhatAUserInstalledComesBeforeThatUsersFlatpaks)
+{
+    const std::string own = "/home/ada/.local/share/";
+    const std::string flatpaks = own + "flatpak/exports/share/";
+    for (const auto& [data, release] : {std::pair(flatpaks, "1"), std::pair(own, "2")}) {
+        scratch.writeFile(data + "applications/a.b.desktop", entryText);
+        scratch.writeFile(data + "metainfo/a.b.metainfo.xml", metadataText("a.b", release));
+        EXPECT_EQ(version("a.b"), release);
+    }
 }
 
 TEST_F(LinuxApplicationRegistryTest, LinksToFilesAreFollowedAndPipesAreNotOpened)

@@ -286,6 +286,7 @@ class Listening(OnABus):
 UNREGISTERED = "com.vorlan.Startwell.applicationUnregistered"
 APPLICATIONS = "/usr/share/applications"
 ALICES = "/home/alice/.local/share/applications"
+ALICES_FLATPAKS = "/home/alice/.local/share/flatpak/exports/share/applications"
 
 
 class Applications(OnABus):
@@ -365,13 +366,14 @@ class Applications(OnABus):
         for identifier, folder in (("org.example.flatpak", "/var/lib/flatpak/exports/share/applications"),
                                    ("org.example.local", "/usr/local/share/applications"),
                                    ("org.example.alices", ALICES),
+                                   ("org.example.alicesflatpak", ALICES_FLATPAKS),
                                    ("kde-org.example.nested", "/usr/share/applications/kde")):
             path = self.install(identifier.removeprefix("kde-"), folder)
             self.is_seen(identifier)
             path.unlink()
             listener.wait_for_signals(len(listener.signals) + 1)
         self.assert_announced(listener, "org.example.flatpak", "org.example.local", "org.example.alices",
-                              "kde-org.example.nested")
+                              "org.example.alicesflatpak", "kde-org.example.nested")
 
     def test_the_applications_of_a_home_that_is_away_are_not_removed(self):
         self.install("org.example.a", ALICES)
@@ -380,6 +382,17 @@ class Applications(OnABus):
         home.rename(self.system.folder / "away")
         home.mkdir()
         self.assert_announced(listener)
+
+    def test_a_users_flatpak_that_is_uninstalled_is_removed(self):
+        deployed = self.install("org.example.a", "/home/alice/.local/share/flatpak/app/org.example.a/export")
+        exported = self.system.real(f"{ALICES_FLATPAKS}/org.example.a.desktop")
+        exported.parent.mkdir(parents=True)
+        exported.symlink_to(os.path.relpath(deployed, exported.parent))
+        listener = self.watch()
+        self.is_seen("org.example.a")
+        shutil.rmtree(self.system.real("/home/alice/.local/share/flatpak/app"))
+        exported.unlink()
+        self.assert_announced(listener, "org.example.a")
 
     def test_the_applications_of_a_user_who_is_gone_are_removed(self):
         self.install("org.example.a", ALICES)
