@@ -26,6 +26,7 @@ constexpr const char* interface = "com.vorlan.typhond.Bench";
 struct Service {
     FileDescriptor view;
     FileDescriptor folder;
+    BareServer::Answers more;
 };
 
 FileDescriptor openBeneath(int folder, const char* path)
@@ -56,7 +57,9 @@ int handle(sd_bus_message* call, void* userdata, sd_bus_error* /*error*/)
         sd_bus_message_read(call, "s", &path);
         return answerWithFile(call, openBeneath(service.folder.get(), path));
     }
-    return 0;
+    const char* member = sd_bus_message_get_member(call);
+    const auto found = service.more.find(member == nullptr ? "" : member);
+    return found == service.more.end() ? 0 : found->second(call);
 }
 
 sd_bus* acceptBus(int listener, Service& service)
@@ -131,13 +134,14 @@ int listenAt(const std::string& path)
     return socket;
 }
 
-BareServer::BareServer(std::string path, std::size_t viewBytes, const std::string& folder)
+BareServer::BareServer(std::string path, std::size_t viewBytes, const std::string& folder, Answers more)
     : path_(std::move(path))
 {
     const FileDescriptor listener(listenAt(path_));
     process_ = Child([&] {
         Service service;
         service.view = sealedMemoryFile(std::vector<std::uint8_t>(viewBytes));
+        service.more = std::move(more);
         service.folder = FileDescriptor(::open(folder.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
         serve(listener.get(), service);
     });

@@ -3,7 +3,11 @@
 #include "child.h"
 
 #include <cstddef>
+#include <functional>
+#include <map>
 #include <string>
+
+#include <systemd/sd-bus.h>
 
 namespace typhon::bench {
 
@@ -12,8 +16,14 @@ namespace typhon::bench {
 /// below its folder) with a descriptor from `openat2`.
 class BareServer {
 public:
-    /// Listens at `path`. The memory file has `viewBytes`; "open" works in `folder`.
-    BareServer(std::string path, std::size_t viewBytes, const std::string& folder = "/");
+    /// Answers a call, and gives what sd-bus gave.
+    using Answer = std::function<int(sd_bus_message* call)>;
+    /// By member.
+    using Answers = std::map<std::string, Answer>;
+
+    /// Listens at `path`. The memory file has `viewBytes`; "open" works in `folder`. `more` is what it
+    /// answers besides.
+    BareServer(std::string path, std::size_t viewBytes, const std::string& folder = "/", Answers more = {});
 
     const std::string& path() const { return path_; }
     pid_t pid() const { return process_.pid(); }

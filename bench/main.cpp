@@ -22,9 +22,10 @@ struct Part {
 };
 
 constexpr Part parts[] = {
-    {"checkin", measureCheckIn},      {"updating", measureUpdating}, {"opening", measureOpening},
-    {"idle", measureIdleConnections}, {"loading", measureLoading},   {"start", measureStart},
-    {"ledger", measureLedger},
+    {"checkin", measureCheckIn},      {"updating", measureUpdating},   {"opening", measureOpening},
+    {"idle", measureIdleConnections}, {"loading", measureLoading},     {"start", measureStart},
+    {"ledger", measureLedger},        {"names", measureNames},         {"shares", measureShares},
+    {"deletion", measureDeletion},    {"broadcast", measureBroadcast}, {"request", measureRequest},
 };
 
 std::vector<std::string> names()

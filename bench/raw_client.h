@@ -27,12 +27,12 @@ public:
     Message openBare(const std::string& path) const;
     /// Opens a file through the file-access service.
     Message openGranted(const std::vector<unsigned char>& token, const std::string& path) const;
+    /// For any other call: one without arguments yet, and its reply once it has them.
+    Message newCall(const char* interface, const char* member) const;
+    Message send(const Message& message) const;
     sd_bus* bus() const { return bus_.get(); }
 
 private:
-    Message newCall(const char* interface, const char* member) const;
-    Message send(const Message& message) const;
-
     std::unique_ptr<sd_bus, Unref> bus_;
 };
 

@@ -11,6 +11,9 @@ std::string amount(double value, Unit unit)
     if (unit == Unit::bytes) {
         return value < 10'000 ? fmt::format("{:.0f} B", value) : fmt::format("{:.1f} kB", value / 1e3);
     }
+    if (value < 1e-6) {
+        return fmt::format("{:.0f} ns", value * 1e9);
+    }
     if (value < 1e-3) {
         return fmt::format("{:.2f} us", value * 1e6);
     }

@@ -13,5 +13,10 @@ void measureOpening(Report& report);
 void measureIdleConnections(Report& report);
 void measureStart(Report& report);
 void measureLedger(Report& report);
+void measureBroadcast(Report& report);
+void measureRequest(Report& report);
+void measureNames(Report& report);
+void measureShares(Report& report);
+void measureDeletion(Report& report);
 
 }  // namespace typhon::bench

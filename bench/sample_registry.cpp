@@ -6,17 +6,20 @@ namespace {
 
 PropertyList entry(int index)
 {
-    const auto family = "Family " + std::to_string(index / 4);
-    const auto postScript = "Family" + std::to_string(index / 4) + "-Style" + std::to_string(index % 4);
     return PropertyList::Dictionary{
         {"disabled", index % 7 == 6},
-        {"familyName", PropertyList::Dictionary{{postScript, family}}},
-        {"registeredBy", "com.example.provider" + std::to_string(index % 20)},
+        {"familyName", PropertyList::Dictionary{{samplePostScriptName(index), sampleFamilyName(index)}}},
+        {"registeredBy", sampleProvider(index % sampleProviders)},
         {"scope", 2},
     };
 }
 
 }  // namespace
+
+std::string sampleProvider(int number)
+{
+    return "com.example.provider" + std::to_string(number);
+}
 
 PropertyList sampleRegistry(int fonts)
 {
@@ -29,8 +32,18 @@ PropertyList sampleRegistry(int fonts)
 
 std::string sampleFontPath(int index)
 {
-    return "/var/mobile/Library/UserFonts/FontFiles/com.example.provider" + std::to_string(index % 20) +
-           "/font-" + std::to_string(index) + ".ttf";
+    return "/var/mobile/Library/UserFonts/FontFiles/" + sampleProvider(index % sampleProviders) + "/font-" +
+           std::to_string(index) + ".ttf";
+}
+
+std::string sampleFamilyName(int index)
+{
+    return "Family " + std::to_string(index / 4);
+}
+
+std::string samplePostScriptName(int index)
+{
+    return "Family" + std::to_string(index / 4) + "-Style" + std::to_string(index % 4);
 }
 
 }  // namespace typhon::bench

@@ -6,10 +6,21 @@
 
 namespace typhon::bench {
 
-/// A registry with that many font files of one face each, of 20 providers; every seventh is switched off.
+inline constexpr int sampleProviders = 20;
+/// The identifier of a provider by its number.
+std::string sampleProvider(int number);
+
+/// A registry with that many font files of one face each, of all providers in turn; every seventh is switched
+/// off.
 PropertyList sampleRegistry(int fonts);
 
-/// The logical path of the font file of that number in it.
+// Of the font file of that number in it:
+
+/// Its logical path.
 std::string sampleFontPath(int index);
+/// The family of its face, which it shares with three others.
+std::string sampleFamilyName(int index);
+/// The PostScript name of its face.
+std::string samplePostScriptName(int index);
 
 }  // namespace typhon::bench

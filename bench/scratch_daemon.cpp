@@ -7,10 +7,12 @@
 #include "raw_client.h"
 #include "sample_registry.h"
 
+#include <algorithm>
 #include <filesystem>
 #include <stdexcept>
 
 #include <fcntl.h>
+#include <sys/resource.h>
 #include <unistd.h>
 
 namespace typhon::bench {
@@ -43,6 +45,19 @@ void execute(const std::string& root)
     ::execl(daemon.c_str(), daemon.c_str(), "--root", root.c_str(), "--log-level", "error", nullptr);
 }
 
+/// Without desktop entries the daemon takes providers for removed applications, and removes their fonts.
+void installApplications(const ScratchDirectory& folder)
+{
+    const auto install = [&](const std::string& identifier) {
+        folder.writeFile("/usr/share/applications/" + identifier + ".desktop",
+                         "[Desktop Entry]\nType=Application\nName=" + identifier + "\n");
+    };
+    install(benchIdentifier);
+    for (int provider = 0; provider < sampleProviders; ++provider) {
+        install(sampleProvider(provider));
+    }
+}
+
 bool answers(const std::string& socketPath)
 {
     try {
@@ -64,6 +79,7 @@ ScratchDaemon::ScratchDaemon(int fonts, const std::vector<std::string>& capabili
                                "/var/mobile/Library/UserFonts/FontAssets", "/run/typhon"}) {
         std::filesystem::create_directories(folder_.real(folder));
     }
+    installApplications(folder_);
     sign(root_, capabilities);
 }
 
@@ -73,6 +89,15 @@ void ScratchDaemon::start()
     while (!answers(socketPath())) {
         ::usleep(1'000);
     }
+}
+
+std::size_t affordableConnections(std::size_t wanted)
+{
+    constexpr std::size_t other = 200;
+    constexpr std::size_t ofOneConnection = 2;
+    rlimit limit{};
+    ::getrlimit(RLIMIT_NOFILE, &limit);
+    return std::min<std::size_t>(wanted, (limit.rlim_cur - other) / ofOneConnection);
 }
 
 std::string ScratchDaemon::socketPath(const std::string& service) const

@@ -5,6 +5,7 @@
 #include "platform/linux/scratch_directory.h"
 #include "platform/property_list.h"
 
+#include <cstddef>
 #include <string>
 #include <vector>
 
@@ -31,6 +32,9 @@ private:
     RootDirectory root_{folder_.path()};
     Child process_;
 };
+
+/// That many connections, or as many as a daemon can have under this process's limit on descriptors.
+std::size_t affordableConnections(std::size_t wanted);
 
 /// The identifier that this program is signed with.
 inline constexpr const char* benchIdentifier = "org.example.bench";
