@@ -1,66 +1,18 @@
 """Removed applications leave nothing behind: with the real relay on a real bus, and after a time without the daemon."""
 
-import json
-import pathlib
-import plistlib
 import unittest
 
-from scratch_bus import Bus, Relay, wait_for_relay
-from scratch_system import FONT_FILES, REGISTRY, ScratchSystem, eventually
+from gi.repository import GLib
 
-SANS = pathlib.Path("/usr/share/fonts/truetype/dejavu/DejaVuSans.ttf")
-UNREGISTERED = "com.vorlan.Startwell.applicationUnregistered"
-SYNCHRONISED = "synchroning FontProviders"
+from removal_system import UNREGISTERED, ApplicationsThatGo
+from scratch_bus import RELAY, Peer
 
 
-class ApplicationRemoval(unittest.TestCase):
-    def setUp(self):
-        self.system = ScratchSystem()
-        self.addCleanup(self.system.close)
-        self.relay = None
+def removal(identifiers):
+    return GLib.Variant("(sa{sv})", (UNREGISTERED, {"bundleIDs": GLib.Variant("as", identifiers)}))
 
-    def start_with_relay(self):
-        bus = Bus(self.system)
-        self.addCleanup(bus.stop)
-        self.relay = Relay(self.system)
-        self.addCleanup(self.relay.stop)
-        wait_for_relay(bus)
-        self.system.start()
-        # Until the daemon hears what is announced.
-        eventually(lambda: self.announce({}) or self.synchronisations() > 0)
 
-    def announce(self, info, name=UNREGISTERED):
-        self.system.ctl("post-notification", name, "--user-info", json.dumps(info))
-
-    def synchronisations(self):
-        return len(self.system.daemon.lines_with(SYNCHRONISED))
-
-    def install(self, identifier):
-        """An application with a font and a record."""
-        self.system.install_application(identifier)
-        if self.relay is not None:
-            # What came and went between two looks was never there.
-            self.relay.wait_for_line(f'application "{identifier}" is installed')
-        self.system.ctl("fonts", "install", "--identifier", identifier, SANS)
-        issues = self.system.preferences().get("issues", {})
-        issues[identifier] = [f"U/{identifier}/DejaVuSans.ttf"]
-        self.system.ctl("preferences", "set", "issues", json.dumps(issues))
-
-    def traces(self, identifier):
-        """What is left of an application: its font's registration, its files, its record."""
-        path = self.system.real(REGISTRY)
-        registry = plistlib.loads(path.read_bytes()) if path.exists() else {}
-        return (any(f"/{identifier}/" in font for font in registry),
-                self.system.real(f"{FONT_FILES}/{identifier}").exists(),
-                identifier in self.system.preferences().get("issues", {}))
-
-    def assert_kept(self, identifier):
-        self.assertEqual(self.traces(identifier), (True, True, True), identifier)
-
-    def wait_until_gone(self, *identifiers):
-        for identifier in identifiers:
-            eventually(lambda: self.traces(identifier) == (False, False, False))
-
+class ApplicationRemoval(ApplicationsThatGo):
     def test_a_removed_application_leaves_nothing_behind(self):
         self.start_with_relay()
         self.install("org.example.going")
@@ -89,6 +41,58 @@ class ApplicationRemoval(unittest.TestCase):
             self.announce({"bundleIDs": unsound})
         self.announce({"bundleIDs": [1, "org.example.going", "", "../org.example.staying", "org.example.nobody"]})
         self.wait_until_gone("org.example.going")
+        self.assert_kept("org.example.staying")
+
+    def test_signals_of_somebody_else_harm_nothing(self):
+        self.start_with_relay()
+        self.install("org.example.staying")
+        self.install("org.example.going")
+        impostor = Peer(self.bus)
+        self.addCleanup(impostor.close)
+        spoofed = removal(["org.example.staying"])
+        for other in impostor.driver("ListNames").unpack()[0]:
+            if other.startswith(":"):
+                impostor.emit(RELAY, spoofed, destination=other)
+        impostor.emit(RELAY, spoofed)
+        self.announce({"bundleIDs": ["org.example.going"]})
+        self.wait_until_gone("org.example.going")
+        self.assert_kept("org.example.staying")
+
+    def test_malformed_signals_of_the_relay_itself_harm_nothing(self):
+        self.start_bus()
+        relay = Peer(self.bus)
+        self.addCleanup(relay.close)
+        relay.own(RELAY)
+        self.system.start()
+        self.wait_until_heard(lambda info: relay.emit(RELAY, GLib.Variant("(sa{sv})", (UNREGISTERED, info))))
+        self.install("org.example.staying")
+        self.install("org.example.going")
+        staying = "org.example.staying"
+        for signature, arguments in (("(s)", (UNREGISTERED,)), ("(sas)", (UNREGISTERED, [staying])),
+                                     ("(sa{ss})", (UNREGISTERED, {"bundleIDs": staying})),
+                                     ("(a{sv}s)", ({"bundleIDs": GLib.Variant("as", [staying])}, UNREGISTERED)),
+                                     ("(sa{sv}s)", (UNREGISTERED, {"bundleIDs": GLib.Variant("as", [staying])}, ""))):
+            relay.emit(RELAY, GLib.Variant(signature, arguments))
+        nested = GLib.Variant("as", [staying])
+        for _ in range(12):
+            nested = GLib.Variant("av", [nested])
+        for unsound in (GLib.Variant("s", staying), nested, GLib.Variant("ay", staying.encode()),
+                        GLib.Variant("a{sv}", {staying: nested})):
+            relay.emit(RELAY, GLib.Variant("(sa{sv})", (UNREGISTERED, {"bundleIDs": unsound})))
+        relay.emit(RELAY, removal(["org.example.going"]))
+        self.wait_until_gone("org.example.going")
+        self.assert_kept(staying)
+
+    def test_a_bus_that_restarts_announces_removals_again(self):
+        self.start_with_relay()
+        self.install("org.example.staying")
+        for identifier in ("org.example.first", "org.example.second"):
+            self.install(identifier)
+            self.bus.stop()
+            self.start_bus()
+            self.wait_until_heard(lambda info: self.announce(info, check=False))
+            self.system.remove_application(identifier)
+            self.wait_until_gone(identifier)
         self.assert_kept("org.example.staying")
 
     def test_what_was_removed_while_no_daemon_ran_goes_at_the_next_start(self):
