@@ -22,10 +22,11 @@ struct Part {
 };
 
 constexpr Part parts[] = {
-    {"checkin", measureCheckIn},      {"updating", measureUpdating},   {"opening", measureOpening},
-    {"idle", measureIdleConnections}, {"loading", measureLoading},     {"start", measureStart},
-    {"ledger", measureLedger},        {"names", measureNames},         {"shares", measureShares},
-    {"deletion", measureDeletion},    {"broadcast", measureBroadcast}, {"request", measureRequest},
+    {"checkin", measureCheckIn},       {"updating", measureUpdating},   {"opening", measureOpening},
+    {"idle", measureIdleConnections},  {"loading", measureLoading},     {"start", measureStart},
+    {"ledger", measureLedger},         {"names", measureNames},         {"shares", measureShares},
+    {"deletion", measureDeletion},     {"broadcast", measureBroadcast}, {"request", measureRequest},
+    {"installing", measureInstalling},
 };
 
 std::vector<std::string> names()

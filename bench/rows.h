@@ -14,6 +14,7 @@ void measureIdleConnections(Report& report);
 void measureStart(Report& report);
 void measureLedger(Report& report);
 void measureBroadcast(Report& report);
+void measureInstalling(Report& report);
 void measureRequest(Report& report);
 void measureNames(Report& report);
 void measureShares(Report& report);
