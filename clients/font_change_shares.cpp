@@ -1,7 +1,7 @@
 #include "clients/font_change_shares.h"
 
+#include "platform/font_directories.h"
 #include "protocol/wire.h"
-#include "registry/font_directories.h"
 
 // Most clients are told the same: enumerating ones of every font that came, all of them of what went, and
 // everybody at all of profile fonts. Those messages are made once a change, so that the work for one more

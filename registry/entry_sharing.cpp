@@ -1,6 +1,6 @@
 #include "registry/entry_sharing.h"
 
-#include "registry/font_directories.h"
+#include "platform/font_directories.h"
 #include "registry/registry_snapshot.h"
 
 namespace typhon {

@@ -1,5 +1,5 @@
+#include "platform/font_directories.h"
 #include "platform/simulated/simulated_platform.h"
-#include "registry/font_directories.h"
 #include "registry/per_client_font_info.h"
 
 #include <random>

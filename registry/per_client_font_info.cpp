@@ -1,6 +1,6 @@
 #include "registry/per_client_font_info.h"
 
-#include "registry/font_directories.h"
+#include "platform/font_directories.h"
 
 // What a client sees follows from three questions: may it see everything, which fonts are its own, and which
 // were issued to it. Each has an index of the registry snapshot behind it, so that no check-in walks the

@@ -1,6 +1,6 @@
 #include "registry/registry_snapshot.h"
 
-#include "registry/font_directories.h"
+#include "platform/font_directories.h"
 
 #include <algorithm>
 #include <iterator>

@@ -1,4 +1,4 @@
-#include "registry/font_directories.h"
+#include "platform/font_directories.h"
 #include "registry/registry_snapshot.h"
 
 #include <gtest/gtest.h>

@@ -1,6 +1,6 @@
 #include "requests/font_name_resolution.h"
 
-#include "registry/font_directories.h"
+#include "platform/font_directories.h"
 
 #include <algorithm>
 #include <iterator>

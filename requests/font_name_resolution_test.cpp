@@ -1,4 +1,4 @@
-#include "registry/font_directories.h"
+#include "platform/font_directories.h"
 #include "testing/request_world.h"
 
 #include <algorithm>

@@ -1,7 +1,7 @@
 #include "requests/issued_paths_ledger.h"
 
+#include "platform/font_directories.h"
 #include "platform/ipc.h"
-#include "registry/font_directories.h"
 
 #include <algorithm>
 #include <array>

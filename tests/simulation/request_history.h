@@ -1,6 +1,6 @@
 #pragma once
 
-#include "registry/font_directories.h"
+#include "platform/font_directories.h"
 #include "simulation/world.h"
 
 #include <algorithm>

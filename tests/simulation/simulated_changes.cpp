@@ -1,8 +1,8 @@
 #include "simulation/simulated_changes.h"
 
 #include "platform/file_url.h"
+#include "platform/font_directories.h"
 #include "protocol/wire.h"
-#include "registry/font_directories.h"
 
 #include <algorithm>
 

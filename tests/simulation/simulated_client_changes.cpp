@@ -1,5 +1,5 @@
 #include "clients/typhon_handler.h"
-#include "registry/font_directories.h"
+#include "platform/font_directories.h"
 #include "simulation/simulated_clients.h"
 
 // What a client hears without having asked: changes of fonts, and what its content processes get.

@@ -1,6 +1,6 @@
 #include "simulation/simulated_clients.h"
 
-#include "registry/font_directories.h"
+#include "platform/font_directories.h"
 
 #include <algorithm>
 #include <array>
