@@ -133,8 +133,8 @@ void ApplicationRemoval::sweepStrayClients()
 
 bool ApplicationRemoval::isStray(const std::string& identifier)
 {
-    // Intended: a placeholder is no application.
-    return !platform_.applicationRegistry.record(identifier, false);
+    // Intended: a placeholder is no application. Who may be installed keeps everything until the next start.
+    return platform_.applicationRegistry.isKnownToBeAbsent(identifier);
 }
 
 }  // namespace typhon

@@ -28,8 +28,8 @@ public:
 
     /// Removes what is left of applications that are not installed: the fonts of providers and the records of
     /// clients. For once after the start, because applications can go while the daemon is not running. An
-    /// application that is there as a placeholder only counts as removed. Returns before the unregistering is
-    /// done. Blocks on the disk.
+    /// application that is there as a placeholder only counts as removed, one of which the registry of
+    /// applications cannot tell does not. Returns before the unregistering is done. Blocks on the disk.
     void sweepStrayEntries();
 
 private:

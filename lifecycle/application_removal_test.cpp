@@ -244,6 +244,20 @@ TEST_F(StrayEntrySweep, AStrayClientIsForgotten)
     EXPECT_EQ(calls(), Calls{});
 }
 
+TEST_F(StrayEntrySweep, NothingIsTakenWhileTheApplicationsCannotBeLookedAt)
+{
+    simulated.applicationRegistry.setComplete(false);
+    sweep();
+    EXPECT_EQ(calls(), Calls{});
+    EXPECT_EQ(simulated.preferences.writes(), 0U);
+    EXPECT_TRUE(simulated.log.entries().empty());
+    removal->setupForDistributedNotifications();
+    announceRemoval(Array{"com.example.foundry"});
+    simulated.drain();
+    EXPECT_EQ(simulated.userFontManager.knownFontProviders(), Calls{"com.example.suite"})
+        << "an announcement is believed all the same";
+}
+
 TEST_F(StrayEntrySweep, StrayProvidersAreUnregisteredWithoutWaiting)
 {
     simulated.userFontManager.holdOperations();

@@ -13,7 +13,7 @@ struct SWApplicationRecord {
     bool isPlaceholder = false;
 };
 
-/// The registry of installed applications. Any thread; an answer is given only after a complete scan.
+/// The registry of installed applications. Any thread.
 class ApplicationRegistry {
 public:
     virtual ~ApplicationRegistry() = default;
@@ -21,6 +21,10 @@ public:
     /// `allowPlaceholder` is false.
     virtual std::optional<SWApplicationRecord> record(const std::string& bundleIdentifier,
                                                       bool allowPlaceholder) = 0;
+    /// True when that application is certainly not installed: everything that could describe it was looked at,
+    /// and nothing does, or only as a placeholder. False also when that cannot be told just now, so that `record`
+    /// may be null and this false.
+    virtual bool isKnownToBeAbsent(const std::string& bundleIdentifier) = 0;
 };
 
 }  // namespace typhon

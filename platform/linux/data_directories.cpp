@@ -39,33 +39,49 @@ FileDescriptor openBase(const DataDirectory& directory)
     return FileDescriptor(::open(directory.base.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
 }
 
+struct Homes {
+    std::set<std::string> paths;
+    bool isComplete = true;
+};
+
+/// Who cannot log in has no applications, and often no home either.
+bool canLogIn(const passwd& user)
+{
+    const std::string shell = user.pw_shell == nullptr ? "" : user.pw_shell;
+    return !shell.ends_with("/nologin") && !shell.ends_with("/false");
+}
+
 /// The user database cannot be walked by two threads at once.
-std::set<std::string> homesOfUsers()
+Homes homesOfUsers()
 {
     static std::mutex walking;
     const std::lock_guard lock(walking);
-    std::set<std::string> homes;
+    Homes homes{.paths = {}, .isComplete = false};
     ::setpwent();
-    for (const auto* user = ::getpwent(); user != nullptr && homes.size() < mostUsers; user = ::getpwent()) {
+    for (const auto* user = ::getpwent(); user != nullptr && homes.paths.size() < mostUsers;
+         user = ::getpwent()) {
+        // There is always a user 0, but not when the database could not be opened.
+        homes.isComplete = homes.isComplete || user->pw_uid == 0;
         const std::string home = user->pw_dir == nullptr ? "" : user->pw_dir;
-        const bool isPerson = user->pw_uid == 0 || user->pw_uid >= firstUser;
+        const bool isPerson = user->pw_uid == 0 || (user->pw_uid >= firstUser && canLogIn(*user));
         if (isPerson && home.starts_with('/') && home != "/") {
-            homes.insert(home);
+            homes.paths.insert(home);
         }
     }
     ::endpwent();
     return homes;
 }
 
-std::set<std::string> homesBelow(const std::string& folder)
+Homes homesBelow(const std::string& folder)
 {
-    std::set<std::string> homes;
-    std::error_code ignored;
-    for (const auto& entry : std::filesystem::directory_iterator(folder, ignored)) {
-        if (homes.size() < mostUsers) {
-            homes.insert(entry.path().string());
+    Homes homes;
+    std::error_code error;
+    for (const auto& entry : std::filesystem::directory_iterator(folder, error)) {
+        if (homes.paths.size() < mostUsers) {
+            homes.paths.insert(entry.path().string());
         }
     }
+    homes.isComplete = !error || error == std::errc::no_such_file_or_directory;
     return homes;
 }
 
@@ -94,15 +110,23 @@ OpenedFile DataDirectory::openFile(const std::string& path) const
     return openRegularFile(pathBelow(*this, path), opened.get(), resolutionFor(*this));
 }
 
-std::vector<DataDirectory> dataDirectories(const RootDirectory& root)
+bool DataDirectory::isAway() const
 {
-    std::vector<DataDirectory> directories;
+    std::error_code error;
+    return isUsers && (std::filesystem::is_empty(base, error) || error);
+}
+
+DataDirectories dataDirectories(const RootDirectory& root)
+{
+    DataDirectories directories;
     for (const char* path : {"/usr/share", "/usr/local/share", "/var/lib/flatpak/exports/share"}) {
-        directories.push_back({.base = root.real(path), .below = {}, .isUsers = false});
+        directories.found.push_back({.base = root.real(path), .below = {}, .isUsers = false});
     }
-    for (const auto& home : root.isScratch() ? homesBelow(root.real("/home")) : homesOfUsers()) {
+    const auto homes = root.isScratch() ? homesBelow(root.real("/home")) : homesOfUsers();
+    directories.isComplete = homes.isComplete;
+    for (const auto& home : homes.paths) {
         for (const char* below : usersData) {
-            directories.push_back({.base = home, .below = below, .isUsers = true});
+            directories.found.push_back({.base = home, .below = below, .isUsers = true});
         }
     }
     return directories;

@@ -26,12 +26,20 @@ struct DataDirectory {
     /// Opens a directory or a regular file of it. `path` is relative to the data directory.
     FileDescriptor openDirectory(const std::string& path) const;
     OpenedFile openFile(const std::string& path) const;
+    /// True when it is a user's and the home is not there to be looked at: gone, closed, or nothing but the
+    /// empty directory onto which it is mounted at that user's next login.
+    bool isAway() const;
 };
 
-/// All data directories: those of the system first, in the order in which they are asked, then those of the
-/// users with a home directory, each user's own before that user's flatpaks. Under a scratch root, homes are
-/// the folders in its /home.
-std::vector<DataDirectory> dataDirectories(const RootDirectory& root);
+struct DataDirectories {
+    /// Those of the system first, in the order in which they are asked, then those of the users with a home
+    /// directory, each user's own before that user's flatpaks. Under a scratch root, homes are the folders in
+    /// its /home.
+    std::vector<DataDirectory> found;
+    /// False when the users could not be listed just now.
+    bool isComplete = true;
+};
+DataDirectories dataDirectories(const RootDirectory& root);
 
 /// Changes when the set of users does.
 std::optional<FileIdentity> identityOfUserDatabase(const RootDirectory& root);

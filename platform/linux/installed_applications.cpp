@@ -24,16 +24,20 @@ constexpr std::int64_t mostMetadataBytesOfUser = 32u << 20;
 constexpr std::string_view entrySuffix = ".desktop";
 constexpr const char* entriesFolder = "applications";
 
-/// Not there, or not for this process: the same to whoever asks, and as lasting.
+/// Not there, or where it may not lead.
 bool isAbsence(int error)
 {
-    return error == ENOENT || error == ENOTDIR || error == EACCES || error == EPERM || error == ELOOP ||
-           error == EXDEV;
+    return error == ENOENT || error == ENOTDIR || error == ELOOP || error == EXDEV;
 }
 
 bool isPassing(int error)
 {
     return error == EMFILE || error == ENFILE || error == ENOMEM || error == EINTR || error == EIO;
+}
+
+bool isDenial(int error)
+{
+    return error == EACCES || error == EPERM;
 }
 
 bool isMetadata(std::string_view name)
@@ -51,6 +55,7 @@ std::string text(const FileContents& contents)
 std::optional<std::string> InstalledApplications::refresh()
 {
     if (scan_ && scan_->isComplete && scan_->isSettled && isCurrent()) {
+        sawAll_ = !scan_->isCut;
         return scan_->complaint;
     }
     Scan scan;
@@ -58,6 +63,7 @@ std::optional<std::string> InstalledApplications::refresh()
     if (contents_ == Contents::entriesAndMetadata) {
         scanMetadata(scan);
     }
+    sawAll_ = scan.isComplete && !scan.isCut;
     auto complaint = scan.complaint;
     if (scan.isComplete || !scan_) {
         scan_ = std::move(scan);
@@ -71,7 +77,8 @@ bool InstalledApplications::isCurrent() const
         const auto directory = where_.openDirectory(path);
         struct stat status {};
         const bool isThere = directory && ::fstat(directory.get(), &status) == 0;
-        if ((isThere ? std::optional(FileIdentity(status)) : std::nullopt) != before) {
+        const bool isKnown = isThere || isAbsence(errno);
+        if (!isKnown || (isThere ? std::optional(FileIdentity(status)) : std::nullopt) != before) {
             return false;
         }
     }
@@ -92,6 +99,7 @@ DirectoryListing InstalledApplications::list(const std::string& path, Scan& scan
         scan.complaint = "cannot list " + path + ": " + errorText(error);
     }
     if (listing.isCut) {
+        scan.isCut = true;
         scan.complaint =
             path + " holds more than " + std::to_string(mostNames) + " names; the rest is ignored";
     }
@@ -103,12 +111,14 @@ void InstalledApplications::scanEntries(const std::string& path, const std::stri
                                         int depth, Scan& scan) const
 {
     if (depth == deepest || scan.directories.size() == mostDirectories) {
+        scan.isCut = true;
         scan.complaint = "directories too deep or too many at " + path + "; they are ignored";
         return;
     }
     const auto listing = list(path, scan);
     for (const std::string_view name : listing.files) {
         const bool fits = scan.entries.size() < mostNames;
+        scan.isCut = scan.isCut || !fits;
         if (fits && name.ends_with(entrySuffix) && name.size() > entrySuffix.size()) {
             const auto stem = name.substr(0, name.size() - entrySuffix.size());
             scan.entries.emplace(identifierPrefix + std::string(stem), path + "/" + std::string(name));
@@ -167,12 +177,33 @@ std::optional<DesktopEntry> InstalledApplications::entry(const std::string& bund
     if (!scan_ || !scan_->entries.contains(bundleIdentifier)) {
         return std::nullopt;
     }
-    const auto opened = where_.openFile(scan_->entries.at(bundleIdentifier));
-    if (opened.error != 0) {
-        return std::nullopt;
-    }
-    const auto contents = readWhole(opened.file.get(), mostEntryBytes);
+    const auto contents = contentsOfEntry(scan_->entries.at(bundleIdentifier));
     return contents.error == 0 ? parseDesktopEntry(text(contents)) : std::nullopt;
+}
+
+bool InstalledApplications::isKnownToBeAbsent(const std::string& bundleIdentifier) const
+{
+    if (!scan_ || !sawAll_ || where_.isAway()) {
+        return false;
+    }
+    if (!scan_->entries.contains(bundleIdentifier)) {
+        return true;
+    }
+    const auto contents = contentsOfEntry(scan_->entries.at(bundleIdentifier));
+    if (contents.error != 0) {
+        return !isPassing(contents.error) && !isDenial(contents.error);
+    }
+    const auto entry = parseDesktopEntry(text(contents));
+    return !entry || entry->isPlaceholder;
+}
+
+FileContents InstalledApplications::contentsOfEntry(const std::string& path) const
+{
+    const auto opened = where_.openFile(path);
+    if (opened.error != 0) {
+        return {.bytes = {}, .error = opened.error};
+    }
+    return readWhole(opened.file.get(), mostEntryBytes);
 }
 
 std::set<std::string> InstalledApplications::identifiers() const
@@ -182,12 +213,9 @@ std::set<std::string> InstalledApplications::identifiers() const
         return identifiers;
     }
     for (const auto& [identifier, path] : scan_->entries) {
-        const auto opened = where_.openFile(path);
-        const auto contents =
-            opened.error == 0 ? readWhole(opened.file.get(), mostEntryBytes) : FileContents{};
-        const int error = opened.error != 0 ? opened.error : contents.error;
+        const auto contents = contentsOfEntry(path);
         // What the machine could not do just now says nothing about the application.
-        if (error == 0 ? parseDesktopEntry(text(contents)).has_value() : isPassing(error)) {
+        if (contents.error == 0 ? parseDesktopEntry(text(contents)).has_value() : isPassing(contents.error)) {
             identifiers.insert(identifier);
         }
     }

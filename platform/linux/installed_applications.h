@@ -33,6 +33,9 @@ public:
 
     /// The desktop entry of the application; null when it is not installed here.
     std::optional<DesktopEntry> entry(const std::string& bundleIdentifier) const;
+    /// True when the application is certainly not installed here, or only as a placeholder: the directory was
+    /// there, and looked at whole, when it was refreshed.
+    bool isKnownToBeAbsent(const std::string& bundleIdentifier) const;
     /// Every application that has an entry here, and those whose entry could not be read just now.
     std::set<std::string> identifiers() const;
     /// The directories of desktop entries that were there, as paths for `DataDirectory::openDirectory`; the
@@ -60,9 +63,12 @@ private:
         std::optional<std::string> complaint;
         /// False when the machine could not do it just now.
         bool isComplete = true;
+        /// True when there was too much to look at.
+        bool isCut = false;
     };
 
     bool isCurrent() const;
+    FileContents contentsOfEntry(const std::string& path) const;
     DirectoryListing list(const std::string& path, Scan& scan) const;
     void scanEntries(const std::string& path, const std::string& identifierPrefix, int depth,
                      Scan& scan) const;
@@ -72,6 +78,8 @@ private:
     DataDirectory where_;
     Contents contents_;
     std::optional<Scan> scan_;
+    /// True when the latest look saw everything.
+    bool sawAll_ = false;
     /// By path. Kept from scan to scan, so that only new files are parsed.
     std::map<std::string, Metadata> metadata_;
 };

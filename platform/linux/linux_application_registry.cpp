@@ -21,6 +21,15 @@ std::optional<SWApplicationRecord> LinuxApplicationRegistry::record(const std::s
     return known ? std::optional(std::move(known->record)) : std::nullopt;
 }
 
+bool LinuxApplicationRegistry::isKnownToBeAbsent(const std::string& bundleIdentifier)
+{
+    const std::lock_guard lock(mutex_);
+    refresh();
+    return hasAllSources_ && std::ranges::all_of(sources_, [&](const Source& source) {
+               return source.applications.isKnownToBeAbsent(bundleIdentifier);
+           });
+}
+
 std::vector<LinuxApplicationRegistry::Known> LinuxApplicationRegistry::applications()
 {
     const std::lock_guard lock(mutex_);
@@ -87,11 +96,12 @@ void LinuxApplicationRegistry::refresh()
 void LinuxApplicationRegistry::refreshDirectories()
 {
     const auto users = identityOfUserDatabase(root_);
-    if (!sources_.empty() && users && users == users_) {
+    if (hasAllSources_ && users && users == users_) {
         return;
     }
     std::vector<Source> sources;
-    for (auto& where : dataDirectories(root_)) {
+    auto directories = dataDirectories(root_);
+    for (auto& where : directories.found) {
         const auto known = std::ranges::find(sources_, where.path(),
                                              [](const Source& source) { return source.where.path(); });
         if (known != sources_.end()) {
@@ -103,6 +113,7 @@ void LinuxApplicationRegistry::refreshDirectories()
     }
     sources_ = std::move(sources);
     users_ = users;
+    hasAllSources_ = directories.isComplete;
 }
 
 }  // namespace typhon

@@ -23,6 +23,7 @@ public:
 
     std::optional<SWApplicationRecord> record(const std::string& bundleIdentifier,
                                               bool allowPlaceholder) override;
+    bool isKnownToBeAbsent(const std::string& bundleIdentifier) override;
 
     /// An application and the data directory whose entry counts.
     struct Known {
@@ -51,6 +52,8 @@ private:
     /// Those of the system first.
     std::vector<Source> sources_;
     std::optional<FileIdentity> users_;
+    /// True when `sources_` are all there are.
+    bool hasAllSources_ = false;
 };
 
 }  // namespace typhon

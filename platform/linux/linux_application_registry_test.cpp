@@ -1,5 +1,6 @@
 #include "platform/linux/linux_application_registry.h"
 #include "platform/linux/scratch_directory.h"
+#include "testing/no_new_descriptors.h"
 
 #include <filesystem>
 #include <string>
@@ -213,6 +214,48 @@ TEST_F(LinuxApplicationRegistryTest, AUserWithTooMuchMetadataIsCutShortAndLogged
     EXPECT_EQ(version("a.b"), "1");
     ASSERT_EQ(log.messages.size(), 1u);
     EXPECT_THAT(log.messages[0], HasSubstr("metainfo is too large"));
+}
+
+TEST_F(LinuxApplicationRegistryTest, AFirstLookThatFailsIsRepeated)
+{
+    scratch.writeFile("/usr/share/applications/a.b.desktop", entryText);
+    scratch.writeFile("/home/ada/.local/share/applications/c.d.desktop", entryText);
+    {
+        const NoNewDescriptors shortage;
+        EXPECT_FALSE(isInstalled("a.b"));
+        EXPECT_FALSE(isInstalled("c.d"));
+        EXPECT_FALSE(registry.isKnownToBeAbsent("a.b"));
+    }
+    EXPECT_TRUE(isInstalled("a.b"));
+    EXPECT_TRUE(isInstalled("c.d"));
+    EXPECT_FALSE(log.messages.empty());
+}
+
+TEST_F(LinuxApplicationRegistryTest, WhileAHomeIsAwayNothingIsKnownToBeAbsent)
+{
+    scratch.writeFile("/home/ada/.local/share/applications/a.b.desktop", entryText);
+    EXPECT_TRUE(registry.isKnownToBeAbsent("c.d"));
+    std::filesystem::rename(scratch.real("/home/ada"), scratch.real("/ada"));
+    std::filesystem::create_directory(scratch.real("/home/ada"));
+    EXPECT_FALSE(isInstalled("a.b"));
+    EXPECT_FALSE(registry.isKnownToBeAbsent("a.b"));
+    EXPECT_FALSE(registry.isKnownToBeAbsent("c.d")) << "it could be there too";
+    std::filesystem::remove(scratch.real("/home/ada"));
+    std::filesystem::rename(scratch.real("/ada"), scratch.real("/home/ada"));
+    EXPECT_TRUE(isInstalled("a.b"));
+    EXPECT_TRUE(registry.isKnownToBeAbsent("c.d"));
+}
+
+TEST_F(LinuxApplicationRegistryTest, AHomeWithoutApplicationsIsNotAway)
+{
+    scratch.writeFile("/home/ada/.profile", "");
+    EXPECT_TRUE(registry.isKnownToBeAbsent("a.b"));
+}
+
+TEST_F(LinuxApplicationRegistryTest, WhatWasTooMuchToLookAtIsNotKnownToBeAbsent)
+{
+    scratch.writeFile("/usr/share/applications/1/2/3/4/5/deep.desktop", entryText);
+    EXPECT_FALSE(registry.isKnownToBeAbsent("1-2-3-4-5-deep"));
 }
 
 TEST(LinuxApplicationRegistryOnThisMachine, AnswersWithoutAScratchRoot)

@@ -21,6 +21,10 @@ public:
         }
         return found->second;
     }
+    bool isKnownToBeAbsent(const std::string& bundleIdentifier) override
+    {
+        return isComplete_ && !record(bundleIdentifier, false);
+    }
 
     /// Adds the application, or replaces its record.
     void install(SWApplicationRecord record)
@@ -29,9 +33,12 @@ public:
         records_.insert_or_assign(std::move(identifier), std::move(record));
     }
     void remove(const std::string& bundleIdentifier) { records_.erase(bundleIdentifier); }
+    /// Whether all there is can be looked at, as at first. When not, nothing is known to be absent.
+    void setComplete(bool isComplete) { isComplete_ = isComplete; }
 
 private:
     std::map<std::string, SWApplicationRecord> records_;
+    bool isComplete_ = true;
 };
 
 }  // namespace typhon

@@ -1,3 +1,4 @@
+#include "../../platform/linux/testing/no_new_descriptors.h"
 #include "platform/linux/linux_application_registry.h"
 #include "platform/linux/scratch_directory.h"
 #include "platform/simulated/simulated_application_registry.h"
@@ -20,6 +21,8 @@ public:
     virtual ApplicationRegistry& registry() = 0;
     virtual void install(const SWApplicationRecord& record) = 0;
     virtual void remove(const std::string& bundleIdentifier) = 0;
+    /// Whether what is installed can be looked at.
+    virtual void letLook(bool may) = 0;
 };
 
 class SimulatedSubject final : public Subject {
@@ -27,6 +30,7 @@ public:
     ApplicationRegistry& registry() override { return registry_; }
     void install(const SWApplicationRecord& record) override { registry_.install(record); }
     void remove(const std::string& bundleIdentifier) override { registry_.remove(bundleIdentifier); }
+    void letLook(bool may) override { registry_.setComplete(may); }
 
 private:
     SimulatedApplicationRegistry registry_;
@@ -51,6 +55,10 @@ public:
     {
         std::filesystem::remove(scratch_.real(entry(bundleIdentifier)));
     }
+    void letLook(bool may) override
+    {
+        shortage_ = may ? nullptr : std::make_unique<NoNewDescriptors>();
+    }
 
 private:
     static std::string entry(const std::string& bundleIdentifier)
@@ -61,6 +69,7 @@ private:
     ScratchDirectory scratch_;
     SimulatedLog log_;
     LinuxApplicationRegistry registry_{RootDirectory(scratch_.path()), log_};
+    std::unique_ptr<NoNewDescriptors> shortage_;
 };
 
 struct Implementation {
@@ -73,6 +82,10 @@ protected:
     std::optional<SWApplicationRecord> record(const std::string& identifier, bool allowPlaceholder = false)
     {
         return subject->registry().record(identifier, allowPlaceholder);
+    }
+    bool isKnownToBeAbsent(const std::string& identifier)
+    {
+        return subject->registry().isKnownToBeAbsent(identifier);
     }
     const std::unique_ptr<Subject> subject = GetParam().make();
 };
@@ -120,6 +133,33 @@ TEST_P(ApplicationRegistryContract, UpdatesAndRemovalsAreSeen)
     EXPECT_EQ(record("com.example.letters")->shortVersionString, "2.2");
     subject->remove("com.example.letters");
     EXPECT_FALSE(record("com.example.letters", true));
+}
+
+TEST_P(ApplicationRegistryContract, AbsentIsWhatIsNotInstalledOrOnlyAPlaceholder)
+{
+    EXPECT_TRUE(isKnownToBeAbsent("com.example.letters"));
+    subject->install({.bundleIdentifier = "com.example.letters", .shortVersionString = "1"});
+    subject->install(
+        {.bundleIdentifier = "com.example.numbers", .shortVersionString = "1", .isPlaceholder = true});
+    EXPECT_FALSE(isKnownToBeAbsent("com.example.letters"));
+    EXPECT_TRUE(isKnownToBeAbsent("com.example.numbers"));
+    subject->remove("com.example.letters");
+    EXPECT_TRUE(isKnownToBeAbsent("com.example.letters"));
+}
+
+TEST_P(ApplicationRegistryContract, NothingIsKnownToBeAbsentWhileNothingCanBeLookedAt)
+{
+    subject->install({.bundleIdentifier = "com.example.letters", .shortVersionString = "1"});
+    subject->letLook(false);
+    EXPECT_FALSE(isKnownToBeAbsent("com.example.letters"));
+    EXPECT_FALSE(isKnownToBeAbsent("com.example.numbers"));
+    subject->letLook(true);
+    EXPECT_TRUE(record("com.example.letters"));
+    EXPECT_TRUE(isKnownToBeAbsent("com.example.numbers"));
+    subject->letLook(false);
+    EXPECT_FALSE(isKnownToBeAbsent("com.example.numbers")) << "also not after it could";
+    subject->letLook(true);
+    EXPECT_TRUE(isKnownToBeAbsent("com.example.numbers"));
 }
 
 INSTANTIATE_TEST_SUITE_P(, ApplicationRegistryContract,

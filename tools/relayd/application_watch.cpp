@@ -99,7 +99,8 @@ bool ApplicationWatch::watchEverything()
 void ApplicationWatch::findSources()
 {
     std::map<std::string, Source> sources;
-    for (auto& where : dataDirectories(root_)) {
+    auto directories = dataDirectories(root_);
+    for (auto& where : directories.found) {
         const auto path = where.path();
         auto known = sources_.extract(path);
         if (known.empty()) {
@@ -109,6 +110,10 @@ void ApplicationWatch::findSources()
         } else {
             sources.insert(std::move(known));
         }
+    }
+    if (!directories.isComplete) {
+        // A user who could not be listed just now is still there.
+        sources.merge(sources_);
     }
     sources_ = std::move(sources);
 }
