@@ -41,6 +41,11 @@ ClientError notThere(const std::string& why)
 [[noreturn]] void becomeHelper(const char* program, char* const* arguments, const char* log, int sign)
 {
     constexpr int signOfLife = STDERR_FILENO + 1;
+    // At once: whoever starts the helper may be killed, and its successor needs the name of its socket.
+    if (::dup2(sign, signOfLife) == sign) {
+        ::fcntl(sign, F_SETFD, 0);
+    }
+    ::close_range(signOfLife + 1, ~0U, 0);
     ::setsid();
     if (::fork() != 0) {
         ::_exit(0);
@@ -50,9 +55,6 @@ ClientError notThere(const std::string& why)
     ::dup2(input, STDIN_FILENO);
     ::dup2(output < 0 ? input : output, STDOUT_FILENO);
     ::dup2(output < 0 ? input : output, STDERR_FILENO);
-    if (::dup2(sign, signOfLife) == sign) {
-        ::fcntl(sign, F_SETFD, 0);
-    }
     ::close_range(signOfLife + 1, ~0U, 0);
     // What the daemon may do beyond others is not for the helper.
     ::prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0, 0, 0);

@@ -16,6 +16,8 @@ namespace typhon {
 
 namespace {
 
+constexpr mode_t runPermissions = 0755;
+
 std::optional<ino_t> inodeOfSocket(const RootDirectory& root)
 {
     struct stat status {};
@@ -29,10 +31,16 @@ HelperLife::HelperLife(RootDirectory root, Options options)
     : root_(std::move(root)), options_(options), socket_(inodeOfSocket(root_))
 {}
 
+bool HelperLife::awaitName(const RootDirectory& root, std::chrono::milliseconds patience)
+{
+    makeDirectories(root.real(helper_files::runDirectory), runPermissions);
+    const FileLock name(pathOfService(root, font_registry_wire::serviceName) + ".lock", patience);
+    return !name.error();
+}
+
 std::optional<std::string> HelperLife::announce(const RootDirectory& root)
 {
-    constexpr mode_t directoryPermissions = 0755;
-    if (auto error = makeDirectories(root.real(helper_files::runDirectory), directoryPermissions)) {
+    if (auto error = makeDirectories(root.real(helper_files::runDirectory), runPermissions)) {
         return error;
     }
     const auto text = std::to_string(::getpid()) + "\n";

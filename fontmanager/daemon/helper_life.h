@@ -26,6 +26,11 @@ public:
     /// The socket is there already.
     HelperLife(RootDirectory root, Options options);
 
+    /// True when no other helper holds the name of the service, or as soon as that is so: the one before this
+    /// may have been killed just now.
+    static bool awaitName(const RootDirectory& root,
+                          std::chrono::milliseconds patience = std::chrono::seconds(10));
+
     /// Writes the file that tells the process identifier, before there is a socket, so that whoever can
     /// connect can read it. Null, or why it cannot.
     static std::optional<std::string> announce(const RootDirectory& root);

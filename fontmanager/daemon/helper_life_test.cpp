@@ -49,6 +49,14 @@ TEST_F(HelperLifeTest, BesideADaemonItStays)
     EXPECT_EQ(life.reasonToEnd(0, start + 3h), "nobody needs it");
 }
 
+TEST_F(HelperLifeTest, ItsNameIsFreeWhenTheOneBeforeIsGone)
+{
+    EXPECT_FALSE(HelperLife::awaitName(root, 0ms));
+    socket.lock = FileDescriptor();
+    EXPECT_TRUE(HelperLife::awaitName(root));
+    EXPECT_TRUE(listenForService(root, font_registry_wire::serviceName).socket) << "it does not keep it";
+}
+
 TEST_F(HelperLifeTest, WithItsSocketGoneItEndsAtOnce)
 {
     ASSERT_EQ(::unlink(socket.path.c_str()), 0);

@@ -132,6 +132,10 @@ int run(const Options& options)
                                    .log = helper.log},
         OwnUser{.user = ::geteuid(), .isServiceUser = !helper.root.isScratch() && runsAsServiceUser()});
     const bool isSocketActivated = sd_listen_fds(0) > 0;
+    if (!isSocketActivated && !HelperLife::awaitName(helper.root)) {
+        TYLog_Error(helper.log, "another helper serves this system");
+        return 1;
+    }
     if (const auto error = isSocketActivated ? std::nullopt : HelperLife::announce(helper.root)) {
         TYLog_Error(helper.log, *error);
     }

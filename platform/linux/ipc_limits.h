@@ -28,6 +28,9 @@ struct IpcLimits {
     std::chrono::nanoseconds handshake = std::chrono::seconds(25);
     /// From the first bytes of a message to its last, where it does not come at once.
     std::chrono::nanoseconds wholeMessage = std::chrono::seconds(25);
+    /// How long to try for the name of a service that another process still holds, as one does that was
+    /// killed just now, until the last of its threads and of the children that it was starting is gone.
+    std::chrono::nanoseconds nameOfService = std::chrono::seconds(30);
     /// Parts of unfinished messages, of one process, and of all processes of one user.
     std::size_t heldBytesPerProcess = 64U << 20;
     std::size_t heldBytesPerUser = 256U << 20;

@@ -109,12 +109,7 @@ LinuxIpc::~LinuxIpc()
 
 std::shared_ptr<Listener> LinuxIpc::listenerForService(std::string name)
 {
-    auto socket = listenForService(context_->root, name);
-    if (!socket.socket) {
-        TYLog_Error(context_->log, "cannot listen on " + name + ": " + socket.problem);
-    }
-    return std::make_shared<LinuxListener>(context_, std::move(name), std::move(socket),
-                                           BusLink::Role::server);
+    return LinuxListener::ofService(context_, std::move(name));
 }
 
 std::shared_ptr<Listener> LinuxIpc::anonymousListener()

@@ -149,13 +149,61 @@ TEST(LinuxIpc, PathsMayBeLongerThanASocketAddress)
     EXPECT_TRUE(service.log.waitFor("noted far away"));
 }
 
+TEST(LinuxIpc, ANameIsTriedForUntilAKilledProcessAndItsChildrenAreGone)
+{
+    TestedService service;
+    service.listener->invalidate();
+    // What a killed process left behind, with a child that has not yet executed its program.
+    auto left = listenForService(service.root, testedService);
+    ASSERT_TRUE(left.socket);
+    const auto waiting = service.ipc->listenerForService(testedService);
+    waiting->setDelegate(service.delegate);
+    waiting->resume();
+    EXPECT_EQ(service.log.countContaining("listening on com.vorlan.test"), 0U);
+    left = ListeningSocket();
+    EXPECT_TRUE(service.log.waitFor("listening on com.vorlan.test"));
+    ForeignClient client(service.path());
+    EXPECT_TRUE(client.isAlive());
+    EXPECT_EQ(service.log.countContaining("another process serves com.vorlan.test; trying again"), 1U);
+    EXPECT_EQ(service.log.countContaining("cannot listen"), 0U);
+}
+
+TEST(LinuxIpc, ANameThatStaysTakenIsGivenUp)
+{
+    const TestedService first;
+    IpcLimits limits;
+    limits.nameOfService = std::chrono::nanoseconds(0);
+    AwaitedLog log;
+    EventPool pool;
+    LinuxWorkQueues queues{pool};
+    LinuxIpc ipc(pool, queues, log, first.root, tokenOfPeer, limits);
+    const auto second = ipc.listenerForService(testedService);
+    second->resume();
+    EXPECT_TRUE(log.waitFor("cannot listen on com.vorlan.test: another process serves it"));
+}
+
+TEST(LinuxIpc, ANameIsNotTriedForAfterInvalidation)
+{
+    TestedService service;
+    const auto second = service.ipc->listenerForService(testedService);
+    const auto third = service.ipc->listenerForService(testedService);
+    second->resume();
+    second->invalidate();
+    third->setDelegate(service.delegate);
+    third->resume();
+    service.listener->invalidate();
+    EXPECT_TRUE(service.log.waitFor("listening on com.vorlan.test"));
+    ForeignClient client(service.path());
+    EXPECT_TRUE(client.isAlive()) << "the third is there, and the second was not in its way";
+}
+
 TEST(LinuxIpc, ASocketLeftBehindIsReplacedALiveOneIsNot)
 {
     TestedService service;
     LinuxIpc second(service.pool, service.queues, service.log, service.root, tokenOfPeer);
     const auto refused = second.listenerForService(testedService);
     refused->resume();
-    EXPECT_EQ(service.log.countContaining("cannot listen on com.vorlan.test: another process serves it"), 1U);
+    EXPECT_EQ(service.log.countContaining("another process serves com.vorlan.test; trying again"), 1U);
     ForeignClient client(service.path());
     EXPECT_TRUE(client.isAlive());
 

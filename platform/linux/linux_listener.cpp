@@ -35,6 +35,18 @@ LinuxListener::LinuxListener(std::shared_ptr<IpcContext> context, std::string na
       socket_(std::make_shared<const ListeningSocket>(std::move(socket))), reserve_(newReserve())
 {}
 
+std::shared_ptr<LinuxListener> LinuxListener::ofService(std::shared_ptr<IpcContext> context, std::string name)
+{
+    auto socket = listenForService(context->root, name);
+    if (socket.isTaken) {
+        TYLog(context->log, "another process serves " + name + "; trying again");
+    } else if (!socket.socket) {
+        TYLog_Error(context->log, "cannot listen on " + name + ": " + socket.problem);
+    }
+    return std::make_shared<LinuxListener>(std::move(context), std::move(name), std::move(socket),
+                                           BusLink::Role::server);
+}
+
 LinuxListener::~LinuxListener()
 {
     closeSocket();
@@ -48,20 +60,62 @@ void LinuxListener::setDelegate(std::weak_ptr<ListenerDelegate> delegate)
 
 void LinuxListener::resume()
 {
-    const auto self = shared_from_this();
     {
         const std::lock_guard lock(mutex_);
-        if (!socket_ || !socket_->socket || watch_) {
+        if (!socket_ || watch_ || retry_) {
             return;
         }
-        watch_ = context_->pool.watch(socket_->socket.get(), [weak = weak_from_this()](std::uint32_t) {
-            if (const auto listener = weak.lock()) {
-                listener->handleEvents();
-            }
-        });
+        if (socket_->isTaken) {
+            nameDeadline_ = std::chrono::steady_clock::now() + context_->limits.nameOfService;
+            tryForNameLater();
+        } else if (socket_->socket) {
+            watchSocket();
+        } else {
+            return;
+        }
     }
-    context_->listeners.add(self);
-    arm();
+    context_->listeners.add(shared_from_this());
+}
+
+void LinuxListener::watchSocket()
+{
+    watch_ = context_->pool.watch(socket_->socket.get(), [weak = weak_from_this()](std::uint32_t) {
+        if (const auto listener = weak.lock()) {
+            listener->handleEvents();
+        }
+    });
+    watch_->arm(EPOLLIN);
+}
+
+void LinuxListener::tryForNameLater()
+{
+    retry_ = context_->queues.createTimer(*context_->deadlines, [weak = weak_from_this()] {
+        if (const auto self = weak.lock()) {
+            self->tryForName();
+        }
+    });
+    retry_->schedule(retryDelay, retryDelay);
+}
+
+void LinuxListener::tryForName()
+{
+    const std::lock_guard lock(mutex_);
+    if (!socket_ || watch_) {
+        return;
+    }
+    auto socket = listenForService(context_->root, name_);
+    if (socket.isTaken && std::chrono::steady_clock::now() < nameDeadline_) {
+        retry_->schedule(retryDelay, retryDelay);
+        return;
+    }
+    context_->dispose(std::move(retry_));
+    if (!socket.socket) {
+        TYLog_Error(context_->log, "cannot listen on " + name_ + ": " + socket.problem);
+        return;
+    }
+    socket_ = std::make_shared<const ListeningSocket>(std::move(socket));
+    watchSocket();
+    TYLog(context_->log, "listening on " + name_);
 }
 
 void LinuxListener::invalidate()

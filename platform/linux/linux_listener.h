@@ -5,8 +5,10 @@
 #include "platform/linux/ipc_context.h"
 #include "platform/linux/listening_sockets.h"
 
+#include <chrono>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
 
 namespace typhon {
@@ -17,6 +19,8 @@ public:
     /// `name` is for messages; `role` is ours in the handshake of accepted connections.
     LinuxListener(std::shared_ptr<IpcContext> context, std::string name, ListeningSocket socket,
                   BusLink::Role role);
+    /// The listener of a named service. While another process holds the name, `resume` begins to try for it.
+    static std::shared_ptr<LinuxListener> ofService(std::shared_ptr<IpcContext> context, std::string name);
     ~LinuxListener() override;
 
     void setDelegate(std::weak_ptr<ListenerDelegate> delegate) override;
@@ -27,6 +31,9 @@ public:
 private:
     enum class Accepting { more, done, later };
 
+    void watchSocket();
+    void tryForNameLater();
+    void tryForName();
     void handleEvents();
     Accepting acceptOne(int listening);
     Accepting acceptFailed(int listening, int error);
@@ -46,6 +53,8 @@ private:
     std::weak_ptr<ListenerDelegate> delegate_;
     std::unique_ptr<EventPool::Watch> watch_;
     std::unique_ptr<Timer> retry_;
+    /// When to give up trying for the name.
+    std::optional<std::chrono::steady_clock::time_point> nameDeadline_;
 
     // Below: used by the one thread that handles the watch.
     /// Given up to accept, and close, a connection when there are no other descriptors left.

@@ -136,8 +136,10 @@ ListeningSocket listenForService(const RootDirectory& root, const std::string& n
     const auto path = pathOfService(root, name);
     result.lock = lockService(path);
     if (!result.lock) {
-        return failed(errno == EWOULDBLOCK ? "another process serves it"
-                                           : path + ".lock: " + std::strerror(errno));
+        result.isTaken = errno == EWOULDBLOCK;
+        result.problem =
+            result.isTaken ? "another process serves it" : path + ".lock: " + std::strerror(errno);
+        return result;
     }
     if (!removeStaleSocket(path)) {
         return failed(path + " is in the way");

@@ -18,6 +18,8 @@ struct ListeningSocket {
     FileDescriptor endpoint;
     /// Set when there is no socket.
     std::string problem;
+    /// True when that is because another process holds the name, which may be about to end.
+    bool isTaken = false;
 };
 
 /// Where the socket of a service is.

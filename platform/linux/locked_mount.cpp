@@ -2,6 +2,7 @@
 
 #include "platform/linux/inode.h"
 
+#include <algorithm>
 #include <cstring>
 #include <string>
 #include <string_view>
@@ -113,6 +114,21 @@ bool isReadOnly(int mount)
     return ::fstatvfs(mount, &fileSystem) == 0 && (fileSystem.f_flag & ST_RDONLY) != 0;
 }
 
+/// The child must not hold the daemon's sockets, should the daemon be killed meanwhile. System calls only.
+void closeAllBut(int one, int another)
+{
+    const auto first = static_cast<unsigned>(std::min(one, another));
+    const auto last = static_cast<unsigned>(std::max(one, another));
+    constexpr unsigned afterStandardStreams = STDERR_FILENO + 1;
+    if (first > afterStandardStreams) {
+        ::close_range(afterStandardStreams, first - 1, 0);
+    }
+    if (last > first + 1) {
+        ::close_range(first + 1, last - 1, 0);
+    }
+    ::close_range(last + 1, ~0U, 0);
+}
+
 }  // namespace
 
 FileDescriptor lockedReadOnlyMount(int directory)
@@ -126,6 +142,7 @@ FileDescriptor lockedReadOnlyMount(int directory)
     const Identifiers identifiers;
     const pid_t child = ::fork();
     if (child == 0) {
+        closeAllBut(directory, theirs.get());
         const int mount = makeMount(directory, identifiers);
         if (mount >= 0) {
             send(theirs.get(), mount);

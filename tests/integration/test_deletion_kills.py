@@ -5,7 +5,6 @@ never scheduled never goes. TYPHON_DELETION_ROUNDS sets how often, TYPHON_DELETI
 import os
 import plistlib
 import random
-import socket
 import threading
 import time
 import unittest
@@ -16,7 +15,7 @@ gi.require_version("Gio", "2.0")
 from gi.repository import GLib  # noqa: E402
 
 from foreign_client import Client  # noqa: E402
-from scratch_system import FONT_FILES, PREFERENCES, Daemon, ScratchSystem, eventually, in_seconds  # noqa: E402
+from scratch_system import FONT_FILES, PREFERENCES, Daemon, ScratchSystem, in_seconds  # noqa: E402
 
 ROUNDS = int(os.environ.get("TYPHON_DELETION_ROUNDS", "8"))
 SEED = os.environ.get("TYPHON_DELETION_SEED", "1")
@@ -96,14 +95,6 @@ class Kills(unittest.TestCase):
         self.system.stop()
         return recorder
 
-    def nobody_listens(self):
-        with socket.socket(socket.AF_UNIX) as probe:
-            try:
-                probe.connect(str(self.system.socket_path()))
-            except OSError:
-                return True
-        return False
-
     def judge(self, scheduled, due, flushed, waiting):
         self.assertLessEqual(flushed, scheduled, "what was flushed and is not due is still scheduled")
         self.assertLessEqual(scheduled, set(due) | set(waiting))
@@ -120,8 +111,6 @@ class Kills(unittest.TestCase):
     def finish(self, still_due):
         """The next daemon deletes what is still due."""
         before = self.system.preferences().get("delete", {})
-        # A child that the killed daemon was just starting may hold its sockets for a moment.
-        eventually(self.nobody_listens)
         daemon = self.system.start()
         if before:
             waits = set(before) - still_due
