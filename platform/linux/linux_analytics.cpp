@@ -25,8 +25,7 @@ bool isThere(const std::string& path)
     return ::stat(path.c_str(), &status) == 0 && S_ISSOCK(status.st_mode);
 }
 
-/// The boot, as the journal names it.
-std::string bootIdentifier()
+std::string readBootIdentifier()
 {
     const FileDescriptor file(::open("/proc/sys/kernel/random/boot_id", O_RDONLY | O_CLOEXEC));
     char text[64];
@@ -35,6 +34,13 @@ std::string bootIdentifier()
     for (const char c : std::string_view(text, static_cast<std::size_t>(length > 0 ? length : 0))) {
         identifier += c == '-' || c == '\n' ? std::string() : std::string(1, c);
     }
+    return identifier;
+}
+
+/// The boot, as the journal names it.
+const std::string& bootIdentifier()
+{
+    static const auto identifier = readBootIdentifier();
     return identifier;
 }
 
