@@ -20,6 +20,7 @@
 #include "platform/linux/linux_remote_alerts.h"
 #include "platform/linux/linux_sandbox.h"
 #include "platform/linux/linux_work_queues.h"
+#include "platform/linux/memory_file.h"
 #include "platform/linux/process_inspection.h"
 #include "platform/linux/process_limits.h"
 #include "platform/linux/sandbox_instances.h"
@@ -52,7 +53,8 @@ struct Options {
 /// The services of Linux, each after those it stands on.
 struct LinuxServices {
     explicit LinuxServices(const Options& options)
-        : root(options.root), log(options.logLevel), ipc(pool, queues, log, root, tokenOfPeer)
+        : root(options.root), log(options.logLevel),
+          ipc(pool, queues, log, root, tokenOfPeer, limitsOfDaemon())
     {}
 
     RootDirectory root;
@@ -125,6 +127,7 @@ void run(const Options& options)
                              .isInternalBuild = options.isInternalBuild};
 
     logProcessIdentity(services.log);
+    logMissingMemoryFiles(services.log);
     const auto broker = std::make_shared<FileAccessBroker>(services.codeSigning, services.tokens,
                                                            services.root, services.log);
     const auto sandboxes = std::make_shared<SandboxesService>(services.sandboxInstances, services.log);

@@ -67,7 +67,8 @@ BusLink::BusLink(std::shared_ptr<IpcContext> context, FileDescriptor socket, Rol
     : peer(peerToken), context_(std::move(context)), role_(role), owner_(std::move(owner)),
       socket_(std::move(socket)),
       reception_({context_->limits.message.bytes, context_->limits.message.descriptors},
-                 std::make_unique<HeldBytes::Claim>(context_->heldBytes, peerToken))
+                 std::make_unique<HeldBytes::Claim>(context_->heldBytes, peerToken)),
+      outgoing_(std::make_unique<HeldBytes::Claim>(context_->heldBytes, peerToken))
 {}
 
 BusLink::~BusLink()
@@ -490,6 +491,7 @@ void BusLink::end(Afterwards& afterwards, bool tellOwner)
     context_->dispose(std::move(handshakeTimer_));
     context_->dispose(std::move(messageTimer_));
     reception_.take();
+    outgoing_.clear();
     while (!pending_.empty()) {
         completeCall(pending_.begin()->first, {std::nullopt, disconnectedError}, afterwards);
     }

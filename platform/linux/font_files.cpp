@@ -5,6 +5,7 @@
 #include "platform/linux/regular_file.h"
 
 #include <cerrno>
+#include <utility>
 
 #include <fcntl.h>
 #include <linux/openat2.h>
@@ -46,9 +47,22 @@ std::shared_ptr<const FontFiles::Mount> FontFiles::mountOf(const FontTree& tree,
         known = std::make_shared<const Mount>(Mount{*identity, std::move(mount)});
     } else if (!hasComplained_) {
         hasComplained_ = true;
-        TYLog_Error(log_, "no private read-only mounts on this system: font files are handed out as copies");
+        TYLog_Error(
+            log_, "no private read-only mounts on this system: font files are handed out as copies in memory"
+                  " (allow user namespaces: user.max_user_namespaces above 0)");
     }
     return known;
+}
+
+void FontFiles::complainUnless(bool copied)
+{
+    const std::lock_guard lock(mutex_);
+    if (!copied && !std::exchange(hasComplainedOfCopies_, true)) {
+        TYLog_Error(
+            log_,
+            "font files cannot be handed out: there are neither read-only mounts (allow user namespaces) nor "
+            "memory for copies of them (allow memfd_create; a font file has at most 64 MiB then)");
+    }
 }
 
 FontFiles::Opening FontFiles::open(const std::string& path)
@@ -72,6 +86,7 @@ FontFiles::Opening FontFiles::open(const std::string& path)
     auto file = std::move(opened.file);
     if (!mount) {
         file = copyOf(file.get());
+        complainUnless(static_cast<bool>(file));
     }
     const auto failure = file ? Failure::none : Failure::refused;
     return {std::move(file), failure};

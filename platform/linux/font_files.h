@@ -41,6 +41,7 @@ private:
         FileDescriptor descriptor;
     };
     std::shared_ptr<const Mount> mountOf(const FontTree& tree, int directory);
+    void complainUnless(bool copied);
 
     const RootDirectory& root_;
     Log& log_;
@@ -48,6 +49,7 @@ private:
     std::map<std::string_view, std::shared_ptr<const Mount>> mounts_;
     bool usesMounts_ = true;
     bool hasComplained_ = false;
+    bool hasComplainedOfCopies_ = false;
 };
 
 }  // namespace typhon

@@ -11,12 +11,13 @@
 
 namespace typhon {
 
-/// Counts the memory that peers make this process hold for messages that are not whole yet. Any thread.
+/// Counts the memory that peers make this process hold: parts of messages that are not whole yet, arguments
+/// of calls that nobody has answered, and what they leave unread. Any thread.
 class HeldBytes : public std::enable_shared_from_this<HeldBytes> {
 public:
     HeldBytes(std::size_t perProcess, std::size_t perUser) : perProcess_(perProcess), perUser_(perUser) {}
 
-    /// What one connection holds; given back when it is destroyed.
+    /// What is held for one connection; given back when it is destroyed.
     class Claim {
     public:
         Claim(std::shared_ptr<HeldBytes> held, const AuditToken& peer) : held_(std::move(held)), peer_(peer)
@@ -32,7 +33,16 @@ public:
             bytes_ += granted ? bytes : 0;
             return granted;
         }
+        std::size_t bytes() const { return bytes_; }
         void release() { held_->give(peer_, std::exchange(bytes_, 0)); }
+        /// Gives back all but `bytes`.
+        void shrinkTo(std::size_t bytes)
+        {
+            if (bytes < bytes_) {
+                held_->give(peer_, bytes_ - bytes);
+                bytes_ = bytes;
+            }
+        }
 
     private:
         const std::shared_ptr<HeldBytes> held_;

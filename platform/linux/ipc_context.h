@@ -5,6 +5,7 @@
 #include "platform/linux/event_pool.h"
 #include "platform/linux/held_bytes.h"
 #include "platform/linux/ipc_limits.h"
+#include "platform/linux/memory_return.h"
 #include "platform/linux/offender_log.h"
 #include "platform/linux/opened_bus.h"
 #include "platform/linux/root_directory.h"
@@ -76,6 +77,7 @@ struct IpcContext {
     const std::shared_ptr<WorkQueue> deadlines;
     const std::shared_ptr<ConnectionAccounting> accounting;
     const std::shared_ptr<HeldBytes> heldBytes;
+    const std::shared_ptr<MemoryReturn> memoryReturn;
     OffenderLog offenders;
     const IdleSocket idleSocket;
     LiveObjects<LinuxConnection> connections;

@@ -31,9 +31,22 @@ struct IpcLimits {
     /// How long to try for the name of a service that another process still holds, as one does that was
     /// killed just now, until the last of its threads and of the children that it was starting is gone.
     std::chrono::nanoseconds nameOfService = std::chrono::seconds(30);
-    /// Parts of unfinished messages, of one process, and of all processes of one user.
-    std::size_t heldBytesPerProcess = 64U << 20;
-    std::size_t heldBytesPerUser = 256U << 20;
+    /// Parts of unfinished messages, arguments of unanswered calls, and what was left unread: of one process,
+    /// and of all processes of one user.
+    std::size_t heldBytesPerProcess = 128U << 20;
+    std::size_t heldBytesPerUser = 512U << 20;
+    /// From the end of a connection until free memory is given back to the system; zero for never.
+    std::chrono::nanoseconds memoryReturn{};
 };
+
+/// Those of the daemon. Nobody has to tell it as much as it tells others, whose views have every font.
+inline IpcLimits limitsOfDaemon()
+{
+    IpcLimits limits;
+    limits.message.memoryFileBytes = 16U << 20;
+    limits.message.memoryFileValues = 1U << 20;
+    limits.memoryReturn = std::chrono::seconds(10);
+    return limits;
+}
 
 }  // namespace typhon

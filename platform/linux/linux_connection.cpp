@@ -164,6 +164,7 @@ void LinuxConnection::invalidate()
     enqueue(runInvalidation, afterwards);
     run(afterwards);
     context_->connections.remove(this);
+    context_->memoryReturn->connectionClosed();
 }
 
 void LinuxConnection::linkClosed(BusLink& link, BusLink::Afterwards& afterwards)
@@ -189,7 +190,10 @@ void LinuxConnection::linkClosed(BusLink& link, BusLink::Afterwards& afterwards)
         enqueue(std::move(item), afterwards);
     }
     if (lifetime_ == Lifetime::oneSocket) {
-        afterwards.push_back([self = shared_from_this()] { self->context_->connections.remove(self.get()); });
+        afterwards.push_back([self = shared_from_this()] {
+            self->context_->connections.remove(self.get());
+            self->context_->memoryReturn->connectionClosed();
+        });
     }
 }
 

@@ -82,7 +82,8 @@ void LinuxConnection::receivedCall(BusLink& link, sd_bus_message* call, BusLink:
         }
         return;
     }
-    auto charge = unanswered_->charge(reading.memory);
+    auto charge = unanswered_->charge(reading.memory,
+                                      std::make_unique<HeldBytes::Claim>(context_->heldBytes, link.peer));
     if (!charge) {
         refuseExcess(link, call, afterwards);
         return;

@@ -70,6 +70,8 @@ std::shared_ptr<IpcContext> makeContext(EventPool& pool, WorkQueues& queues, Log
 {
     auto accounting =
         std::make_shared<ConnectionAccounting>(limits.connectionsPerProcess, limits.connectionsPerUser);
+    auto deadlines = queues.createSerialQueue("com.vorlan.typhond.deadlines");
+    auto memoryReturn = std::make_shared<MemoryReturn>(queues, deadlines, limits.memoryReturn);
     // Not an aggregate that could be made in place: it holds a mutex.
     // NOLINTNEXTLINE(modernize-make-shared)
     return std::shared_ptr<IpcContext>(
@@ -80,9 +82,10 @@ std::shared_ptr<IpcContext> makeContext(EventPool& pool, WorkQueues& queues, Log
                        std::move(identifyPeer),
                        limits,
                        handshake,
-                       queues.createSerialQueue("com.vorlan.typhond.deadlines"),
+                       std::move(deadlines),
                        std::move(accounting),
                        std::make_shared<HeldBytes>(limits.heldBytesPerProcess, limits.heldBytesPerUser),
+                       std::move(memoryReturn),
                        OffenderLog(log),
                        IdleSocket(),
                        {},

@@ -210,7 +210,8 @@ LinuxListener::Accepting LinuxListener::acceptFailed(int listening, int error)
         return Accepting::more;
     }
     if (!std::exchange(shortageLogged_, true)) {
-        TYLog_Error(context_->log, "connections to " + name_ + " are refused: " + std::strerror(error));
+        TYLog_Error(context_->log, "connections to " + name_ + " are refused: " + std::strerror(error) +
+                                       " (raise the limit of the service, LimitNOFILE, or end clients)");
     }
     if (error != EMFILE && error != ENFILE) {
         return Accepting::later;

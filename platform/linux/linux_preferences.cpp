@@ -75,9 +75,9 @@ bool LinuxPreferences::synchronize()
     if (error) {
         // Back to the changes that wait for the next time, but for those that were overtaken meanwhile.
         changed_.merge(beingWritten_);
-        complain(complaintOfWriting_,
-                 "the preferences were not written: " + *error +
-                     "; the changes are kept in memory and tried again with the next one");
+        complain(complaintOfWriting_, "the preferences were not written: " + *error +
+                                          "; make room, or make it writable: the changes are kept in memory "
+                                          "and tried again with the next one");
     } else {
         complaintOfWriting_.clear();
     }

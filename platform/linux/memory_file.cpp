@@ -90,4 +90,12 @@ std::optional<std::vector<std::uint8_t>> contentsOfSealedMemoryFile(int descript
     return bytes;
 }
 
+void logMissingMemoryFiles(Log& log)
+{
+    if (!emptyMemoryFile()) {
+        TYLog_Error(log, "no memory files on this system: large views travel inside messages, which is slow "
+                         "(allow the service the call memfd_create)");
+    }
+}
+
 }  // namespace typhon

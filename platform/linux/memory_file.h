@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/linux/file_descriptor.h"
+#include "platform/log.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -19,5 +20,8 @@ FileDescriptor reopenedReadOnly(int memoryFile);
 /// The contents of a memory file received from somebody else, or null when it is not one, is not sealed
 /// against writing and resizing, or is larger than `limit`.
 std::optional<std::vector<std::uint8_t>> contentsOfSealedMemoryFile(int descriptor, std::size_t limit);
+
+/// Says in the log when this system has no memory files, in the way of which large values travel.
+void logMissingMemoryFiles(Log& log);
 
 }  // namespace typhon

@@ -1,12 +1,15 @@
 #pragma once
 
 #include "platform/linux/bus_message_codec.h"
+#include "platform/linux/held_bytes.h"
 #include "platform/linux/ipc_limits.h"
 
 #include <cstddef>
 #include <cstdint>
 #include <deque>
+#include <memory>
 #include <string>
+#include <utility>
 
 namespace typhon {
 
@@ -14,15 +17,20 @@ namespace typhon {
 /// descriptors on their way. The caller locks.
 class OutgoingQueue {
 public:
+    explicit OutgoingQueue(std::unique_ptr<HeldBytes::Claim> held) : held_(std::move(held)) {}
     /// Notes a message that is about to be handed to sd-bus. `socket` is the connection's.
     void sending(const MessageAppending& size, int socket);
     /// Notes how many messages wait now.
     void update(std::uint64_t waiting);
     bool isEmpty() const { return waiting_ == 0; }
+    /// Forgets everything, at the end of the connection.
+    void clear();
     /// Why the peer is not worth waiting for, or empty.
     std::string excess(const IpcLimits& limits) const;
 
 private:
+    const std::unique_ptr<HeldBytes::Claim> held_;
+    bool tooMuchHeld_ = false;
     std::uint64_t waiting_ = 0;
     /// Sizes of the latest messages, at least of those that wait and were sent here.
     std::deque<std::size_t> sizes_;

@@ -74,10 +74,10 @@ void logProcessIdentity(Log& log)
 {
     static std::once_flag once;
     std::call_once(once, [&log] {
-        TYLog(log,
-              kernelHasProcessInodes()
-                  ? "processes are told apart by their pidfd inode"
-                  : "processes are told apart by their start time only: this kernel has no pidfd inodes");
+        TYLog(log, kernelHasProcessInodes() ? "processes are told apart by their pidfd inode"
+                                            : "processes are told apart by their start time only: this "
+                                              "kernel has no pidfd inodes (Linux 6.9 "
+                                              "has them)");
     });
 }
 

@@ -2,6 +2,7 @@
 
 #include <csignal>
 
+#include <malloc.h>
 #include <sys/resource.h>
 
 namespace typhon {
@@ -9,6 +10,9 @@ namespace typhon {
 void prepareProcess()
 {
     std::signal(SIGPIPE, SIG_IGN);
+    // Otherwise the allocator learns from a first large message to keep the memory of the next ones.
+    constexpr int returnedAtOnce = 256 << 10;
+    ::mallopt(M_MMAP_THRESHOLD, returnedAtOnce);
     rlimit limit{};
     if (getrlimit(RLIMIT_NOFILE, &limit) == 0) {
         limit.rlim_cur = limit.rlim_max;

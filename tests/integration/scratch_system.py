@@ -37,8 +37,8 @@ ctypes.CDLL(None).prctl(PR_SET_CHILD_SUBREAPER, 1, 0, 0, 0)
 class Daemon:
     """A running typhond and what it logs."""
 
-    def __init__(self, system, arguments=(), popen_options=None):
-        command = [BIN / "typhond", "--root", system.root, "--log-level", "debug", *arguments]
+    def __init__(self, system, arguments=(), popen_options=None, launcher=()):
+        command = [*launcher, BIN / "typhond", "--root", system.root, "--log-level", "debug", *arguments]
         self.process = subprocess.Popen(
             [str(part) for part in command], stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
             stderr=subprocess.PIPE, text=True, errors="replace", **(popen_options or {}))
@@ -212,8 +212,9 @@ class ScratchSystem:
     def socket_path(self, service=SERVICE):
         return self.real(f"/run/typhon/{service}")
 
-    def start(self, *arguments, **popen_options):
-        self.daemon = Daemon(self, arguments, popen_options)
+    def start(self, *arguments, launcher=(), **popen_options):
+        """Starts the daemon, by `launcher` if there is one, and waits for its services."""
+        self.daemon = Daemon(self, arguments, popen_options, launcher)
         for service in (SERVICE, f"{SERVICE}.file-access", f"{SERVICE}.sandboxes", f"{SERVICE}.identities",
                         HELPER_SERVICE):
             self.wait_for_socket(self.socket_path(service))
