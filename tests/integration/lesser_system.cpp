@@ -46,7 +46,7 @@ const std::map<std::string, std::vector<Missing>> systems{
     {"user-namespaces", {userNamespaces}},
     {"copies", {memoryFiles, userNamespaces}},
     {"old-kernel",
-     {{SYS_fstatfs, ENOSYS}, {SYS_getsockopt, ENOPROTOOPT, 2, peerPidfd}, {SYS_ioctl, ENOTTY, 1, pidfdInfo}}},
+     {{SYS_statfs, ENOSYS}, {SYS_getsockopt, ENOPROTOOPT, 2, peerPidfd}, {SYS_ioctl, ENOTTY, 1, pidfdInfo}}},
 };
 
 std::uint32_t offsetOfArgument(int index)
