@@ -106,10 +106,11 @@ private:
             setAt_ = never;
             setTimer();
         }
-        watch_->arm(EPOLLIN);
+        // Before the next event, which another thread might handle: what is due earlier is called earlier.
         for (auto& function : due) {
             function();
         }
+        watch_->arm(EPOLLIN);
     }
 
     /// A timer left over from a call that was cancelled is not taken back: it finds nothing due.
