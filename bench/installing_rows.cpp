@@ -121,6 +121,7 @@ void measureMatching(Report& report)
         std::ofstream(path, std::ios::binary) << smallFont(index);
     });
     std::vector<std::string> families;
+    families.reserve(200);
     for (int index = 0; index < 200; ++index) {
         families.push_back(sampleFamilyName(index * 25));
     }

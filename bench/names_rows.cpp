@@ -26,6 +26,7 @@ constexpr int batch = 1'000;
 std::vector<std::string> chosenNames(int fonts, int count, std::string (*nameOf)(int))
 {
     std::vector<std::string> names;
+    names.reserve(static_cast<std::size_t>(count));
     for (int index = 0; index < count; ++index) {
         names.push_back(nameOf(index * (fonts / count)));
     }

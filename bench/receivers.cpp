@@ -56,7 +56,7 @@ void hold(const std::string& socketPath, std::size_t share, const char* interfac
             while (sd_bus_process(static_cast<sd_bus*>(ready.data.ptr), nullptr) > 0) {
             }
         }
-        for (; received / share > announced; ++announced) {
+        for (; received >= (announced + 1) * share; ++announced) {
             giveSign(signs);
         }
     }
