@@ -23,6 +23,7 @@ namespace typhon {
 namespace {
 
 const IpcError disconnectedError{ipc_errors::disconnected, "the connection is gone"};
+constexpr int messagesAtOnce = 16;
 
 constexpr const char* noMessage = "it sent something that is no message";
 
@@ -122,28 +123,36 @@ void BusLink::close()
 
 void BusLink::handleEvents(std::uint32_t events)
 {
-    // The next event may be handled, by another thread, while this one goes on with what has arrived.
-    locked([&](Afterwards& afterwards) {
-        if (ended_) {
-            return;
-        }
-        if (!ready_) {
-            proceedWithHandshake(afterwards);
-            return;
-        }
-        if ((events & EPOLLOUT) != 0) {
-            processOutput(afterwards);
-        }
-        if (!ended_) {
-            processInput(afterwards);
-        }
-        if (!ended_) {
-            checkOutgoing(afterwards);
-        }
-        if (!ended_) {
-            arm();
-        }
-    });
+    // What arrives meanwhile is not announced to another thread, which could do no more than wait for this
+    // one: it is read when this one is done, up to the number of messages after which others get their turn.
+    bool hasRead = true;
+    for (int count = 0; hasRead && count < messagesAtOnce; ++count) {
+        locked([&](Afterwards& afterwards) { hasRead = handleInput(std::exchange(events, 0), afterwards); });
+    }
+    const std::lock_guard lock(mutex_);
+    if (!ended_ && ready_) {
+        arm();
+    }
+}
+
+/// True when there may be more to read.
+bool BusLink::handleInput(std::uint32_t events, Afterwards& afterwards)
+{
+    if (ended_) {
+        return false;
+    }
+    if (!ready_) {
+        proceedWithHandshake(afterwards);
+        return false;
+    }
+    if ((events & EPOLLOUT) != 0) {
+        processOutput(afterwards);
+    }
+    const bool hasRead = !ended_ && processInput(afterwards);
+    if (!ended_) {
+        checkOutgoing(afterwards);
+    }
+    return hasRead && !ended_;
 }
 
 void BusLink::arm()
@@ -191,22 +200,27 @@ void BusLink::becomeReady(Afterwards& afterwards)
     }
 }
 
-/// Reads at most one message; what is left announces itself again.
-void BusLink::processInput(Afterwards& afterwards)
+/// Reads at most one message; true if there was one.
+bool BusLink::processInput(Afterwards& afterwards)
 {
     using Outcome = MessageReception::Outcome;
     const auto outcome = reception_.next(bus_.socket());
     if (outcome == Outcome::ready) {
         processReadyMessage(afterwards);
-    } else if (outcome == Outcome::assembled) {
+        return true;
+    }
+    if (outcome == Outcome::assembled) {
         processAssembledMessage(afterwards);
-    } else if (outcome == Outcome::begun) {
+        return true;
+    }
+    if (outcome == Outcome::begun) {
         awaitRest();
     } else if (outcome == Outcome::closed) {
         end(afterwards, true);
     } else if (const auto* offence = offenceOf(outcome)) {
         punishLocked(offence, afterwards);
     }
+    return false;
 }
 
 void BusLink::processReadyMessage(Afterwards& afterwards)
@@ -243,7 +257,7 @@ void BusLink::awaitRest()
 
 void BusLink::processOutput(Afterwards& afterwards)
 {
-    const int result = outgoing_.isEmpty() ? 0 : bus_.writeOnly(context_->idleSocket);
+    const int result = outgoing_.isEmpty() ? 0 : bus_.writeOnly();
     if (result < 0) {
         abandonLocked(errorText(result), afterwards);
     }

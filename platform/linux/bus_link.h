@@ -95,7 +95,8 @@ private:
     void handleEvents(std::uint32_t events);
     void proceedWithHandshake(Afterwards& afterwards);
     void becomeReady(Afterwards& afterwards);
-    void processInput(Afterwards& afterwards);
+    bool handleInput(std::uint32_t events, Afterwards& afterwards);
+    bool processInput(Afterwards& afterwards);
     void processReadyMessage(Afterwards& afterwards);
     void processAssembledMessage(Afterwards& afterwards);
     void awaitRest();

@@ -7,7 +7,6 @@
 #include "platform/linux/ipc_limits.h"
 #include "platform/linux/memory_return.h"
 #include "platform/linux/offender_log.h"
-#include "platform/linux/opened_bus.h"
 #include "platform/linux/root_directory.h"
 #include "platform/log.h"
 #include "platform/work_queues.h"
@@ -79,7 +78,6 @@ struct IpcContext {
     const std::shared_ptr<HeldBytes> heldBytes;
     const std::shared_ptr<MemoryReturn> memoryReturn;
     OffenderLog offenders;
-    const IdleSocket idleSocket;
     LiveObjects<LinuxConnection> connections;
     LiveObjects<LinuxListener> listeners;
 

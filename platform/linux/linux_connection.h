@@ -6,8 +6,8 @@
 #include "platform/linux/standard_interfaces.h"
 #include "platform/linux/unanswered_calls.h"
 
-#include <deque>
 #include <functional>
+#include <list>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -101,7 +101,7 @@ private:
     std::function<void()> invalidationHandler_;
     std::function<void()> interruptionHandler_;
     std::shared_ptr<BusLink> link_;
-    std::deque<Item> inbox_;
+    std::list<Item> inbox_;
     bool resumed_ = false;
     bool ended_ = false;
     bool invalidatedHere_ = false;

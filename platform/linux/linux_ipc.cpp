@@ -87,7 +87,6 @@ std::shared_ptr<IpcContext> makeContext(EventPool& pool, WorkQueues& queues, Log
                        std::make_shared<HeldBytes>(limits.heldBytesPerProcess, limits.heldBytesPerUser),
                        std::move(memoryReturn),
                        OffenderLog(log),
-                       IdleSocket(),
                        {},
                        {}});
 }

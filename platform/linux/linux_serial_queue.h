@@ -4,7 +4,7 @@
 #include "platform/linux/linux_queue.h"
 
 #include <condition_variable>
-#include <deque>
+#include <list>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -44,7 +44,8 @@ private:
     std::condition_variable turn_;
     unsigned waitingThreads_ = 0;
     std::shared_ptr<LinuxWorkItem> running_;
-    std::deque<std::shared_ptr<LinuxWorkItem>> waiting_;
+    /// A list, which costs nothing while it is empty: most queues belong to idle connections.
+    std::list<std::shared_ptr<LinuxWorkItem>> waiting_;
     /// Where the running item goes on, once some thread takes it.
     std::coroutine_handle<> ready_;
     /// A thread runs a slice, and looks at ready_ when it has returned.

@@ -1,5 +1,7 @@
 #include "platform/linux/opened_bus.h"
 
+#include "platform/linux/bus_message.h"
+
 #include <cerrno>
 #include <cstdint>
 #include <string_view>
@@ -36,27 +38,20 @@ std::size_t waitingBytes(int socket)
 
 }  // namespace
 
-IdleSocket::IdleSocket()
-{
-    makePair(near_, far_);
-}
-
 int OpenedBus::open(bool withDescriptors)
 {
-    FileDescriptor output;
-    if (!makePair(output, far_)) {
+    FileDescriptor near;
+    if (!makePair(near, far_)) {
         return -errno;
     }
-    FileDescriptor input(::fcntl(output.get(), F_DUPFD_CLOEXEC, 3));
     sd_bus* bus = nullptr;
-    int result = input ? sd_bus_new(&bus) : -errno;
+    int result = sd_bus_new(&bus);
     bus_.reset(bus);
     if (result >= 0) {
-        result = sd_bus_set_fd(bus, input.get(), output.get());
+        result = sd_bus_set_fd(bus, near.get(), near.get());
     }
     if (result >= 0) {
-        input_ = input.release();
-        output_ = output.release();
+        socket_ = near.release();
         result = begin(withDescriptors);
     }
     return result;
@@ -84,7 +79,7 @@ int OpenedBus::begin(bool withDescriptors)
 
 int OpenedBus::moveOnto(FileDescriptor socket)
 {
-    if (::dup3(socket.get(), input_, O_CLOEXEC) < 0 || ::dup3(socket.get(), output_, O_CLOEXEC) < 0) {
+    if (::dup3(socket.get(), socket_, O_CLOEXEC) < 0) {
         return -errno;
     }
     far_ = FileDescriptor();
@@ -102,7 +97,7 @@ int OpenedBus::readMessage(std::size_t size, sd_bus_message** message)
     std::uint64_t queuedBefore = 0;
     std::uint64_t queuedAfter = 0;
     sd_bus_get_n_queued_write(bus_.get(), &queuedBefore);
-    const auto before = waitingBytes(output_);
+    const auto before = waitingBytes(socket_);
     sawMessage_ = false;
     const int result = sd_bus_process(bus_.get(), message);
     if (result < 0) {
@@ -112,24 +107,36 @@ int OpenedBus::readMessage(std::size_t size, sd_bus_message** message)
     if (!sawMessage_) {
         return queuedAfter < queuedBefore ? 0 : -EBADMSG;
     }
-    return waitingBytes(output_) + size < before ? -EBADMSG : 1;
+    return waitingBytes(socket_) + size < before ? -EBADMSG : 1;
 }
 
-int OpenedBus::writeOnly(const IdleSocket& idle)
+int OpenedBus::writeOnly()
 {
-    if (::dup3(idle.get(), input_, O_CLOEXEC) < 0) {
-        return -errno;
+    // sd-bus writes what it can, and then takes a message: one that waits in its own queue rather than one
+    // from the socket. So a message of our own is put there, and when it comes out there is nothing more to
+    // write.
+    sd_bus_message* raw = nullptr;
+    int result = sd_bus_message_new_signal(bus_.get(), &raw, "/", "nothing.to", "Read");
+    const BusMessage ours(raw);
+    if (result >= 0) {
+        result = sd_bus_message_seal(raw, 1, 0);
     }
-    const int result = sd_bus_process(bus_.get(), nullptr);
-    return ::dup3(output_, input_, O_CLOEXEC) < 0 ? -errno : result;
+    if (result >= 0) {
+        result = sd_bus_enqueue_for_read(bus_.get(), raw);
+    }
+    sd_bus_message* taken = nullptr;
+    while (result >= 0 && taken == nullptr) {
+        result = sd_bus_process(bus_.get(), &taken);
+    }
+    sd_bus_message_unref(taken);
+    return result;
 }
 
 void OpenedBus::close()
 {
     bus_.reset();
     far_ = FileDescriptor();
-    input_ = -1;
-    output_ = -1;
+    socket_ = -1;
 }
 
 }  // namespace typhon

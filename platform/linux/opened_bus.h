@@ -13,21 +13,10 @@ struct SdBusClose {
     void operator()(sd_bus* bus) const { sd_bus_close_unref(bus); }
 };
 
-/// A socket that is never ready for reading.
-class IdleSocket {
-public:
-    IdleSocket();
-    int get() const { return near_.get(); }
-
-private:
-    FileDescriptor near_;
-    FileDescriptor far_;
-};
-
 /// An sd-bus object that believes to have been through the handshake. sd-bus reads that together with
 /// whatever follows it, and fails when that comes with descriptors; so the real handshake is not its
-/// business. It begins between two sockets of our own, and is moved onto the real one afterwards. It reads
-/// and writes through two descriptors, so that it can be kept from reading. The caller locks.
+/// business. It begins between two sockets of our own, and is moved onto the real one afterwards. The
+/// caller locks.
 class OpenedBus {
 public:
     OpenedBus() = default;
@@ -44,12 +33,12 @@ public:
     int readMessage(std::size_t size, sd_bus_message** message);
     /// Writes as much as the peer takes of what waits, and reads nothing meanwhile. Returns as
     /// `sd_bus_process`.
-    int writeOnly(const IdleSocket& idle);
+    int writeOnly();
     void close();
 
     sd_bus* get() const { return bus_.get(); }
     /// What it writes to, and what announces input and room.
-    int socket() const { return output_; }
+    int socket() const { return socket_; }
     /// The other one of our sockets, before `moveOnto`.
     int farEnd() const { return far_.get(); }
 
@@ -59,9 +48,8 @@ private:
 
     std::unique_ptr<sd_bus, SdBusClose> bus_;
     FileDescriptor far_;
-    // Owned by the bus.
-    int input_ = -1;
-    int output_ = -1;
+    /// Owned by the bus.
+    int socket_ = -1;
     bool sawMessage_ = false;
 };
 

@@ -6,7 +6,7 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <deque>
+#include <list>
 #include <memory>
 #include <string>
 #include <utility>
@@ -33,7 +33,7 @@ private:
     bool tooMuchHeld_ = false;
     std::uint64_t waiting_ = 0;
     /// Sizes of the latest messages, at least of those that wait and were sent here.
-    std::deque<std::size_t> sizes_;
+    std::list<std::size_t> sizes_;
     std::size_t bytes_ = 0;
     std::size_t unreadDescriptors_ = 0;
 };
