@@ -54,7 +54,7 @@ AuditToken tokenOfProcess(int pidfd)
     AuditToken token{.processIdentifier = process->processIdentifier,
                      .effectiveUser = process->effectiveUser,
                      .bootEpoch = bootEpoch()};
-    token.execGeneration = execGeneration(directory.get());
+    token.execGeneration = execGeneration(token.processIdentifier, directory.get());
     if (token.execGeneration == 0 || !setInstance(token, pidfd, directory.get())) {
         return {};
     }

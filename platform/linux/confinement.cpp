@@ -1,11 +1,13 @@
 #include "platform/linux/confinement.h"
 
+#include <charconv>
 #include <string>
 #include <string_view>
 
 #include <fcntl.h>
 #include <linux/stat.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #ifndef STATX_MNT_ID_UNIQUE
 #define STATX_MNT_ID_UNIQUE 0x00004000U
@@ -35,6 +37,23 @@ std::optional<std::array<std::uint64_t, 3>> rootOf(int processDirectory)
     return std::nullopt;
 }
 
+/// The inode number of a namespace, from the text of its link, "mnt:[4026531841]": that takes a third of the
+/// time of looking up what the link leads to.
+std::optional<std::uint64_t> namespaceOf(int processDirectory, const char* name)
+{
+    std::array<char, 64> buffer;
+    const auto length = ::readlinkat(processDirectory, name, buffer.data(), buffer.size());
+    const std::string_view text(buffer.data(), length > 0 ? static_cast<std::size_t>(length) : 0);
+    const auto bracket = text.find(":[");
+    std::uint64_t number = 0;
+    if (bracket == std::string_view::npos || !text.ends_with(']')) {
+        return std::nullopt;
+    }
+    const auto* end = text.data() + text.size() - 1;
+    const auto parsed = std::from_chars(text.data() + bracket + 2, end, number);
+    return parsed.ec == std::errc{} && parsed.ptr == end ? std::optional(number) : std::nullopt;
+}
+
 /// True when the label of an AppArmor or SELinux process leaves it unconfined.
 bool isUnconfined(std::string_view label)
 {
@@ -60,8 +79,8 @@ std::string_view statusLine(std::string_view status, std::string_view name)
 
 ConfinementProbe::View ConfinementProbe::viewOf(int directory)
 {
-    return {inodeAt(directory, "ns/mnt"), inodeAt(directory, "ns/user"), inodeAt(directory, "ns/pid"),
-            rootOf(directory)};
+    return {namespaceOf(directory, "ns/mnt"), namespaceOf(directory, "ns/user"),
+            namespaceOf(directory, "ns/pid"), rootOf(directory)};
 }
 
 ConfinementProbe::ConfinementProbe()
@@ -73,6 +92,7 @@ ConfinementProbe::ConfinementProbe()
     if (!isProcessOne_) {
         host_ = viewOf(self.get());
     }
+    hostProcessNamespace_ = inodeAt(isProcessOne_ ? one.get() : self.get(), "ns/pid");
     // Without a labelling LSM the file exists and reading it fails.
     const FileDescriptor label(::openat(self.get(), "attr/current", O_RDONLY | O_CLOEXEC));
     char first = 0;
@@ -81,7 +101,7 @@ ConfinementProbe::ConfinementProbe()
 
 bool ConfinementProbe::isRestricted(const ProcessInspection& process) const
 {
-    const auto status = process.contents("status", 8192);
+    const auto status = process.status();
     const auto seccomp = status ? statusLine(*status, "\nSeccomp:\t") : std::string_view();
     if (seccomp != "0") {
         return true;
@@ -94,6 +114,15 @@ bool ConfinementProbe::isRestricted(const ProcessInspection& process) const
 }
 
 Confinement ConfinementProbe::look(const ProcessInspection& process) const
+{
+    auto& known = process.seen().confinement;
+    if (!known) {
+        known = examine(process);
+    }
+    return *known;
+}
+
+Confinement ConfinementProbe::examine(const ProcessInspection& process) const
 {
     const auto view = viewOf(process.directory());
     if (!host_.isWhole() || !view.isWhole()) {

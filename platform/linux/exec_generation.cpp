@@ -10,12 +10,18 @@
 #include <elf.h>
 #include <fcntl.h>
 #include <sodium.h>
+#include <sys/uio.h>
 #include <unistd.h>
 
 // An exec leaves the process identifier, the pidfd and the start time as they are. What it renews is the
 // auxiliary vector (addresses under randomisation) and the 16 random bytes that AT_RANDOM points to. Both go
 // into the value: some language run-times wipe the random bytes once they have used them, and the vector is
 // the kernel's copy, which a stray write into the program's own memory does not reach.
+//
+// Both are read anew at every look, of the memory that the process has then. A descriptor of its memory that
+// was kept would go on reading the memory of before the exec, as long as a child shares it. And the vector
+// must be read as well as the bytes: a program can see to it that the next one has known bytes at the address
+// where its own random ones were, but not that the kernel points there.
 
 namespace typhon {
 
@@ -23,19 +29,27 @@ namespace {
 
 constexpr std::size_t randomLength = 16;
 
-/// Reads up to the whole buffer from the start of a file; the number of bytes read.
+/// Reads a file of /proc that fits the buffer; the number of bytes read.
 std::size_t readFile(int directory, const char* name, char* buffer, std::size_t size)
 {
     const FileDescriptor file(::openat(directory, name, O_RDONLY | O_CLOEXEC));
-    std::size_t length = 0;
-    while (file && length < size) {
-        const auto count = ::read(file.get(), buffer + length, size - length);
-        if (count <= 0) {
-            break;
-        }
-        length += static_cast<std::size_t>(count);
+    const auto count = file ? ::read(file.get(), buffer, size) : 0;
+    return count > 0 ? static_cast<std::size_t>(count) : 0;
+}
+
+/// Reads the memory of a process; false unless all of it can be.
+bool readMemory(pid_t process, int directory, std::uint64_t address, char* buffer, std::size_t size)
+{
+    const iovec here{buffer, size};
+    // An address in another process, which means nothing in this one.
+    const iovec there{reinterpret_cast<void*>(address), size};  // NOLINT(performance-no-int-to-ptr)
+    if (::process_vm_readv(process, &here, 1, &there, 1, 0) == static_cast<ssize_t>(size)) {
+        return true;
     }
-    return length;
+    // Some filters on system calls forbid that one.
+    const FileDescriptor memory(::openat(directory, "mem", O_RDONLY | O_CLOEXEC));
+    return memory &&
+           ::pread(memory.get(), buffer, size, static_cast<off_t>(address)) == static_cast<ssize_t>(size);
 }
 
 /// The address under AT_RANDOM in a vector of (type, value) pairs of `Word`, or 0.
@@ -66,7 +80,7 @@ std::uint64_t hashOf(const unsigned char* bytes, std::size_t length)
 
 }  // namespace
 
-std::uint64_t execGeneration(int processDirectory)
+std::uint64_t execGeneration(pid_t processIdentifier, int processDirectory)
 {
     std::array<char, 1024 + randomLength> bytes;
     const auto length = readFile(processDirectory, "auxv", bytes.data(), bytes.size() - randomLength);
@@ -74,9 +88,8 @@ std::uint64_t execGeneration(int processDirectory)
     if (address == 0) {
         address = randomAddress<std::uint32_t>(bytes.data(), length);
     }
-    const FileDescriptor memory(::openat(processDirectory, "mem", O_RDONLY | O_CLOEXEC));
-    if (address == 0 || ::pread(memory.get(), bytes.data() + length, randomLength,
-                                static_cast<off_t>(address)) != static_cast<ssize_t>(randomLength)) {
+    if (address == 0 ||
+        !readMemory(processIdentifier, processDirectory, address, bytes.data() + length, randomLength)) {
         return 0;
     }
     const auto value = hashOf(reinterpret_cast<const unsigned char*>(bytes.data()), length + randomLength);

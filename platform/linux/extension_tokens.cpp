@@ -14,8 +14,9 @@
 //
 //   typhon-extension-1 ; class ; daemon ; target ; nonce ; MAC ; check ; path
 //
-// The MAC is keyed and covers every field but itself and the check. The check is an unkeyed digest of all the
-// rest: it keeps a damaged token from being taken for one of an earlier daemon, and proves nothing else.
+// The MAC is keyed BLAKE2b and covers every field but itself and the check. The check is an unkeyed digest of
+// all the rest: it keeps a damaged token from being taken for one of an earlier daemon, and proves nothing
+// else.
 
 namespace typhon {
 
@@ -25,7 +26,7 @@ constexpr std::string_view heading = "typhon-extension-1;read;";
 constexpr std::size_t instanceLength = 32;
 constexpr std::size_t targetLength = 2 * sizeof(AuditToken);
 constexpr std::size_t nonceLength = 32;
-constexpr std::size_t macLength = 2 * crypto_auth_BYTES;
+constexpr std::size_t macLength = 2 * crypto_generichash_BYTES;
 constexpr std::size_t checkLength = 32;
 
 /// The fields of a token, all of them views into its text.
@@ -82,8 +83,8 @@ const unsigned char* bytesOf(std::string_view text)
 std::string macOf(const Fields& fields, const std::array<std::uint8_t, 32>& key)
 {
     const auto text = joined(fields);
-    std::array<std::uint8_t, crypto_auth_BYTES> mac;
-    crypto_auth(mac.data(), bytesOf(text), text.size(), key.data());
+    std::array<std::uint8_t, crypto_generichash_BYTES> mac;
+    crypto_generichash(mac.data(), mac.size(), bytesOf(text), text.size(), key.data(), key.size());
     return hexOf(mac);
 }
 
@@ -121,7 +122,7 @@ ExtensionTokens::ExtensionTokens()
     if (sodium_init() < 0) {
         std::abort();
     }
-    crypto_auth_keygen(key_.data());
+    crypto_generichash_keygen(key_.data());
     instance_ = randomHex(instanceLength);
 }
 

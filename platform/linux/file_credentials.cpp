@@ -87,7 +87,7 @@ bool setFileSystemId(long call, unsigned id)
 
 std::optional<FileCredentials> fileCredentialsOf(const ProcessInspection& process, bool hasOwnUserNamespace)
 {
-    const auto status = process.contents("status", 64 * 1024);
+    const auto status = process.status();
     auto credentials = status ? parse(*status) : std::nullopt;
     if (credentials && hasOwnUserNamespace) {
         credentials->overrides = 0;

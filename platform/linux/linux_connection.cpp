@@ -6,6 +6,7 @@
 
 #include "platform/argument_types.h"
 #include "platform/connection_work.h"
+#include "platform/linux/message_looks.h"
 
 #include <utility>
 
@@ -226,8 +227,10 @@ void LinuxConnection::enqueue(Item item, BusLink::Afterwards& afterwards)
         const std::lock_guard lock(mutex_);
         inbox_.push_back(std::move(item));
     }
-    afterwards.push_back(
-        [self = shared_from_this()] { self->queue_->asyncForConnection(self, runNext(self)); });
+    afterwards.push_back([self = shared_from_this()] {
+        const MessageLooks shared;
+        self->queue_->asyncForConnection(self, runNext(self));
+    });
 }
 
 LinuxConnection::Item LinuxConnection::takeItem()

@@ -3,69 +3,99 @@
 #include "platform/linux/exec_generation.h"
 #include "platform/linux/pidfd.h"
 
+#include <algorithm>
 #include <mutex>
+#include <utility>
+#include <vector>
 
 #include <fcntl.h>
+#include <unistd.h>
 
 namespace typhon {
 
-ProcessInspection::ProcessInspection(const AuditToken& token, FileDescriptor pidfd, FileDescriptor directory)
-    : token_(token), pidfd_(std::move(pidfd)), directory_(std::move(directory))
-{}
+namespace {
 
-std::optional<ProcessInspection> ProcessInspection::begin(const AuditToken& token)
-{
-    if (token.processIdentifier <= 0 || token.processInstance == 0 || token.execGeneration == 0 ||
-        token.bootEpoch != bootEpoch()) {
-        return std::nullopt;
-    }
-    auto pidfd = openPidfd(token.processIdentifier);
-    if (!pidfd || (kernelHasProcessInodes() && inodeOfPidfd(pidfd.get()) != token.processInstance)) {
-        return std::nullopt;
-    }
-    const auto path = "/proc/" + std::to_string(token.processIdentifier);
-    FileDescriptor directory(::open(path.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    if (!directory || (!kernelHasProcessInodes() && startTime(directory.get()) != token.processInstance)) {
-        return std::nullopt;
-    }
-    return ProcessInspection(token, std::move(pidfd), std::move(directory));
-}
+/// Enough for the status of a process with thousands of groups.
+constexpr std::size_t statusLimit = 64 * 1024;
 
-bool ProcessInspection::isStillTheSame() const
+/// The file from its start, up to the end or to the limit; null when it cannot be read.
+std::optional<std::string> textOf(int file, std::size_t limit)
 {
-    // In this order: a process that still has its number at the end had it, and that directory, since the
-    // pidfd was opened.
-    if (execGeneration(directory_.get()) != token_.execGeneration) {
-        return false;
-    }
-    const auto process = processOfPidfd(pidfd_.get());
-    return process && process->processIdentifier == token_.processIdentifier;
-}
-
-std::optional<std::string> ProcessInspection::contents(const char* name, std::size_t limit) const
-{
-    const FileDescriptor file(::openat(directory_.get(), name, O_RDONLY | O_CLOEXEC));
-    if (!file) {
-        return std::nullopt;
-    }
+    thread_local std::vector<char> buffer(statusLimit);
     std::string text;
     while (text.size() < limit) {
-        const auto before = text.size();
-        text.resize(limit);
-        const auto count = ::read(file.get(), text.data() + before, limit - before);
-        text.resize(before + static_cast<std::size_t>(count > 0 ? count : 0));
+        const auto room = std::min(buffer.size(), limit - text.size());
+        const auto count = ::pread(file, buffer.data(), room, static_cast<off_t>(text.size()));
         if (count < 0) {
             return std::nullopt;
         }
-        if (count == 0) {
+        text.append(buffer.data(), static_cast<std::size_t>(count));
+        // A file of /proc that leaves half of the room is at its end.
+        if (static_cast<std::size_t>(count) < room / 2) {
             break;
         }
     }
     return text;
 }
 
+}  // namespace
+
+ProcessInspection::ProcessInspection(const AuditToken& token, std::shared_ptr<const HeldProcess> process)
+    : token_(token), process_(std::move(process))
+{}
+
+std::optional<ProcessInspection> ProcessInspection::begin(const AuditToken& token)
+{
+    auto process = holdProcess(token);
+    return process ? std::optional(ProcessInspection(token, std::move(process))) : std::nullopt;
+}
+
+SeenOfProcess& ProcessInspection::seen() const
+{
+    auto* shared = MessageLooks::of(token_);
+    return shared == nullptr ? seen_ : *shared;
+}
+
+bool ProcessInspection::isStillTheSame() const
+{
+    // In this order: a process that still has its number at the end had it, and that directory, since the
+    // pidfd was opened.
+    const bool isSameProgram = execGeneration(token_.processIdentifier, directory()) == token_.execGeneration;
+    const auto process = isSameProgram ? processOfPidfd(pidfd()) : std::nullopt;
+    if (!process || process->processIdentifier != token_.processIdentifier) {
+        seen() = {};
+        return false;
+    }
+    if (!seen().isConfirmed) {
+        seen().isConfirmed = true;
+        keepProcess(token_, process_);
+    }
+    return true;
+}
+
+std::optional<std::string> ProcessInspection::contents(const char* name, std::size_t limit) const
+{
+    const FileDescriptor file(::openat(directory(), name, O_RDONLY | O_CLOEXEC));
+    return file ? textOf(file.get(), limit) : std::nullopt;
+}
+
+std::shared_ptr<const std::string> ProcessInspection::status() const
+{
+    auto& known = seen().status;
+    if (!known) {
+        if (auto text = textOf(process_->status.get(), statusLimit)) {
+            known = std::make_shared<const std::string>(*std::move(text));
+        }
+    }
+    return known;
+}
+
 bool isSameProcess(const AuditToken& token)
 {
+    const auto* seen = MessageLooks::of(token);
+    if (seen != nullptr && seen->isConfirmed) {
+        return true;
+    }
     const auto process = ProcessInspection::begin(token);
     return process && process->isStillTheSame();
 }

@@ -1,9 +1,11 @@
 #pragma once
 
 #include "platform/audit_token.h"
-#include "platform/linux/file_descriptor.h"
+#include "platform/linux/held_process.h"
+#include "platform/linux/message_looks.h"
 #include "platform/log.h"
 
+#include <memory>
 #include <optional>
 #include <string>
 
@@ -18,22 +20,29 @@ public:
     static std::optional<ProcessInspection> begin(const AuditToken& token);
 
     /// An `O_PATH` descriptor of the process's directory in /proc. Owned by this.
-    int directory() const { return directory_.get(); }
+    int directory() const { return process_->directory.get(); }
     /// Owned by this.
-    int pidfd() const { return pidfd_.get(); }
+    int pidfd() const { return process_->pidfd.get(); }
 
     /// True when the process still runs the program of the token, and did so since `begin`.
     bool isStillTheSame() const;
 
     /// A file of the process's directory, at most `limit` bytes of it; null when it cannot be read.
-    std::optional<std::string> contents(const char* name, std::size_t limit = 64 * 1024) const;
+    std::optional<std::string> contents(const char* name, std::size_t limit) const;
+    /// Its /proc/PID/status, as far as it is of reasonable length; null when it cannot be read. Read once for
+    /// all looks of the same message.
+    std::shared_ptr<const std::string> status() const;
+
+    /// Where looks remember what they have seen, for the others of the same message.
+    SeenOfProcess& seen() const;
 
 private:
-    ProcessInspection(const AuditToken& token, FileDescriptor pidfd, FileDescriptor directory);
+    ProcessInspection(const AuditToken& token, std::shared_ptr<const HeldProcess> process);
 
     AuditToken token_;
-    FileDescriptor pidfd_;
-    FileDescriptor directory_;
+    std::shared_ptr<const HeldProcess> process_;
+    /// For a look that shares with nobody.
+    mutable SeenOfProcess seen_;
 };
 
 /// Begins an inspection, looks, and gives what `look` returned (an optional) if the process still is the
@@ -52,7 +61,8 @@ auto inspectProcess(const AuditToken& token, Look look) -> decltype(look(*Proces
     return seen;
 }
 
-/// True when the token names a process that still runs the same program.
+/// True when the token names a process that still runs the same program, or did at an earlier look of the
+/// same message.
 bool isSameProcess(const AuditToken& token);
 
 /// Says once in the log by what processes are told apart on this kernel.

@@ -37,7 +37,7 @@ bool walkOutwards(FileDescriptor at, const std::function<bool(const Inode&)>& vi
 
 bool isFirstOfItsNamespace(const ProcessInspection& process)
 {
-    const auto status = process.contents("status", 8192);
+    const auto status = process.status();
     const std::string_view text = status ? std::string_view(*status) : std::string_view();
     // The identifiers of the process in each namespace from the daemon's inwards, separated by tabs.
     const auto line = text.find("\nNSpid:\t");

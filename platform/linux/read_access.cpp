@@ -35,7 +35,7 @@ BorrowedCredentials::~BorrowedCredentials()
 
 bool BorrowedCredentials::ask(const FileCredentials& credentials, const std::function<void()>& question)
 {
-    if (credentials == ownFileCredentials()) {
+    if (credentials == ownCredentials_) {
         question();
         return true;
     }

@@ -39,6 +39,8 @@ private:
     };
     void serve();
 
+    /// All threads but the own one keep those of the process, which do not change.
+    const FileCredentials ownCredentials_ = ownFileCredentials();
     std::mutex mutex_;
     std::condition_variable changed_;
     std::vector<Job*> jobs_;
