@@ -38,6 +38,14 @@ public:
         }
     }
 
+    void erase(const Key& key)
+    {
+        if (const auto found = byKey_.find(key); found != byKey_.end()) {
+            entries_.erase(found->second);
+            byKey_.erase(found);
+        }
+    }
+
     std::size_t size() const { return entries_.size(); }
 
 private:

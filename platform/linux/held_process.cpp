@@ -79,4 +79,11 @@ void keepProcess(const AuditToken& token, const std::shared_ptr<const HeldProces
     processes.store(keyOf(token), process);
 }
 
+void releaseProcess(const AuditToken& token)
+{
+    auto& [mutex, processes] = kept();
+    const std::lock_guard lock(mutex);
+    processes.erase(keyOf(token));
+}
+
 }  // namespace typhon

@@ -23,8 +23,12 @@ struct HeldProcess {
 /// was opened now is surely the token's only once `processOfPidfd` still tells its number.
 std::shared_ptr<const HeldProcess> holdProcess(const AuditToken& token);
 
-/// Keeps the process for later looks. It has been seen to be that of the token.
+/// Keeps the process, which is one that sends messages, for later looks. It has been seen to be that of the
+/// token.
 void keepProcess(const AuditToken& token, const std::shared_ptr<const HeldProcess>& process);
+
+/// Keeps it no longer: a connection of the process has ended, and so, most likely, has the process.
+void releaseProcess(const AuditToken& token);
 
 /// So many are kept, those that were looked at last.
 inline constexpr std::size_t maximumHeldProcesses = 64;

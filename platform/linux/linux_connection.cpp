@@ -6,6 +6,7 @@
 
 #include "platform/argument_types.h"
 #include "platform/connection_work.h"
+#include "platform/linux/held_process.h"
 #include "platform/linux/message_looks.h"
 
 #include <utility>
@@ -211,6 +212,7 @@ Task<void> LinuxConnection::runInvalidation(Self self)
         charge.swap(self->charge_);
         connector.swap(self->connector_);
     }
+    releaseProcess(self->auditToken());
     charge.reset();
     if (invalidation) {
         Task<void> running = connection_work::runCallback(self->context_->log, std::move(invalidation));

@@ -66,8 +66,8 @@ bool ProcessInspection::isStillTheSame() const
         seen() = {};
         return false;
     }
-    if (!seen().isConfirmed) {
-        seen().isConfirmed = true;
+    // Only of senders it is likely that somebody asks about them again.
+    if (!std::exchange(seen().isConfirmed, true) && MessageLooks::of(token_) != nullptr) {
         keepProcess(token_, process_);
     }
     return true;

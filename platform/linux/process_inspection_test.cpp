@@ -31,15 +31,32 @@ std::optional<bool> isSandboxed(const AuditToken& token)
     });
 }
 
+/// What becomes of the first question of a message.
+void lookAtSender(const AuditToken& token)
+{
+    const MessageLooks message;
+    ASSERT_TRUE(isSameProcess(token));
+}
+
 TEST(ProcessInspection, HoldsAProcessFromOneLookToTheNext)
 {
     ChildProcess child(testing::remain);
     ASSERT_EQ(child.read(), "r");
     const auto token = child.token();
-    ASSERT_TRUE(isSameProcess(token));
+    lookAtSender(token);
     const auto held = holdProcess(token);
     ASSERT_TRUE(held);
     EXPECT_EQ(holdProcess(token), held);
+    releaseProcess(token);
+    EXPECT_NE(holdProcess(token), held);
+}
+
+TEST(ProcessInspection, HoldsNothingOfAProcessThatSentNothing)
+{
+    ChildProcess child(testing::remain);
+    ASSERT_EQ(child.read(), "r");
+    ASSERT_TRUE(isSameProcess(child.token()));
+    EXPECT_NE(holdProcess(child.token()), holdProcess(child.token()));
 }
 
 TEST(ProcessInspection, HoldsNothingOfAProcessThatWasNotConfirmed)
@@ -48,6 +65,7 @@ TEST(ProcessInspection, HoldsNothingOfAProcessThatWasNotConfirmed)
     ASSERT_EQ(child.read(), "r");
     auto token = child.token();
     ++token.execGeneration;
+    const MessageLooks message;
     ASSERT_FALSE(isSameProcess(token));
     EXPECT_NE(holdProcess(token), holdProcess(token));
 }
@@ -57,7 +75,7 @@ TEST(ProcessInspection, AHeldProcessThatHasEndedIsNobody)
     ChildProcess child(testing::remain);
     ASSERT_EQ(child.read(), "r");
     const auto token = child.token();
-    ASSERT_TRUE(isSameProcess(token));
+    lookAtSender(token);
     child.end();
     EXPECT_FALSE(isSameProcess(token));
     EXPECT_EQ(isSandboxed(token), std::nullopt);
@@ -68,7 +86,7 @@ TEST(ProcessInspection, AHeldProcessIsNobodyAfterAnExec)
     ChildProcess child({"/bin/sh", "-c", "echo 1; read a; exec /bin/sh -c 'echo 2; read a'"});
     ASSERT_EQ(child.read(), "1\n");
     const auto token = child.token();
-    ASSERT_EQ(isSandboxed(token), false);
+    lookAtSender(token);
     child.write("\n");
     ASSERT_EQ(child.read(), "2\n");
     EXPECT_EQ(isSandboxed(token), std::nullopt);
@@ -79,7 +97,6 @@ TEST(ProcessInspection, AHeldProcessIsNobodyAfterAnExecThoughAChildKeepsItsMemor
     ChildProcess child([](int stream) {
         static std::array<char, 64 * 1024> stack;
         const auto idle = [](void*) -> int {
-            ::prctl(PR_SET_PDEATHSIG, SIGKILL);
             for (;;) {
                 ::pause();
             }
@@ -94,12 +111,14 @@ TEST(ProcessInspection, AHeldProcessIsNobodyAfterAnExecThoughAChildKeepsItsMemor
     });
     ASSERT_EQ(child.read(), "r");
     const auto token = child.token();
-    ASSERT_TRUE(isSameProcess(token));
-    ASSERT_GT(ChildProcess::firstChildOf(child.pid()), 0);
+    lookAtSender(token);
+    const auto keeper = ChildProcess::firstChildOf(child.pid());
+    ASSERT_GT(keeper, 0);
     child.write("x");
     child.waitForEcho();
     EXPECT_FALSE(isSameProcess(token));
     EXPECT_TRUE(isSameProcess(child.token()));
+    ::kill(keeper, SIGKILL);
 }
 
 TEST(ProcessInspection, WhileOneMessageIsHandledAProcessIsSeenAsItWasAtFirst)
