@@ -134,7 +134,9 @@ std::optional<std::string> helperProgram()
 {
     std::error_code error;
     const auto own = std::filesystem::read_symlink("/proc/self/exe", error).parent_path();
-    for (const auto& folder : {own, std::filesystem::path("/usr/libexec/typhon")}) {
+    // Beside this program, where both were installed together, or on the system.
+    for (const auto& folder :
+         {own, own / "../libexec/typhon", std::filesystem::path("/usr/libexec/typhon")}) {
         const auto candidate = (folder / helper_files::program).string();
         if (!folder.empty() && ::access(candidate.c_str(), X_OK) == 0) {
             return candidate;
