@@ -55,10 +55,7 @@ public:
     {
         std::filesystem::remove(scratch_.real(entry(bundleIdentifier)));
     }
-    void letLook(bool may) override
-    {
-        shortage_ = may ? nullptr : std::make_unique<NoNewDescriptors>();
-    }
+    void letLook(bool may) override { shortage_ = may ? nullptr : std::make_unique<NoNewDescriptors>(); }
 
 private:
     static std::string entry(const std::string& bundleIdentifier)
