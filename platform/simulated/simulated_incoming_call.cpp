@@ -35,7 +35,11 @@ void SimulatedIncomingCall::answer(CallResult result)
 {
     const auto at = at_.lock();
     const auto from = from_.lock();
-    if (std::exchange(answered_, true) || call_.number == 0 || !at || !from || !at->isUsable()) {
+    if (call_.number == 0 || !at || !from || !at->isUsable()) {
+        return;
+    }
+    if (std::exchange(answered_, true)) {
+        machine_->repeatedAnswers += at->owner == machine_->ownToken ? 1 : 0;
         return;
     }
     if (result.results) {

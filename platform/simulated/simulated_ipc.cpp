@@ -59,7 +59,7 @@ std::shared_ptr<Connection> SimulatedProcess::connectionToService(std::string na
 }  // namespace
 
 SimulatedIpc::SimulatedIpc(WorkQueues& queues, Log& log, AuditToken ownToken)
-    : machine_(std::make_shared<SimulatedMachine>(queues, log)),
+    : machine_(std::make_shared<SimulatedMachine>(queues, log, ownToken)),
       own_(std::make_shared<SimulatedProcess>(machine_, ownToken))
 {}
 
@@ -120,6 +120,11 @@ void SimulatedIpc::endProcess(const AuditToken& token)
 std::size_t SimulatedIpc::connectionCount() const
 {
     return machine_->resumedConnections.size();
+}
+
+std::size_t SimulatedIpc::repeatedAnswers() const
+{
+    return machine_->repeatedAnswers;
 }
 
 }  // namespace typhon

@@ -43,6 +43,10 @@ public:
     /// Ends of connections that are resumed and not yet invalidated, of all processes.
     std::size_t connectionCount() const;
 
+    /// How often the process under test answered a call that it had answered already, as long as its
+    /// connection was there. The caller never sees it.
+    std::size_t repeatedAnswers() const;
+
 private:
     const std::shared_ptr<SimulatedMachine> machine_;
     const std::shared_ptr<Ipc> own_;

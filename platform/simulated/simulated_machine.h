@@ -5,6 +5,7 @@
 #include "platform/log.h"
 #include "platform/work_queues.h"
 
+#include <cstddef>
 #include <map>
 #include <memory>
 #include <string>
@@ -17,12 +18,17 @@ class SimulatedListener;
 
 /// What the processes of a simulated machine share: who listens, and who is connected.
 struct SimulatedMachine {
-    SimulatedMachine(WorkQueues& workQueues, Log& systemLog)
-        : queues(workQueues), log(systemLog), deadlines(workQueues.createSerialQueue("ipc deadlines"))
+    SimulatedMachine(WorkQueues& workQueues, Log& systemLog, AuditToken own)
+        : queues(workQueues), log(systemLog), ownToken(own),
+          deadlines(workQueues.createSerialQueue("ipc deadlines"))
     {}
 
     WorkQueues& queues;
     Log& log;
+    /// The process under test.
+    const AuditToken ownToken;
+    /// Answers of that process to calls that it had answered already.
+    std::size_t repeatedAnswers = 0;
     /// Runs the handlers of call timers; connection queues may be held by the very item that waits.
     const std::shared_ptr<WorkQueue> deadlines;
     std::map<std::string, std::shared_ptr<SimulatedListener>> services;

@@ -4,6 +4,7 @@
 #include "platform/simulated/simulated_scheduler.h"
 #include "platform/work_queue.h"
 
+#include <cstddef>
 #include <deque>
 #include <memory>
 #include <string>
@@ -46,6 +47,8 @@ public:
     void sync(const std::function<void()>& work) override;
     /// Drops all items, suspended ones included, and takes no more.
     void close();
+    /// Items that wait, run or are suspended.
+    std::size_t itemCount() const { return running_.size() + waiting_.size(); }
 
 private:
     friend class SimulatedItem;

@@ -78,6 +78,16 @@ Task<void> SimulatedWorkQueues::pause(std::chrono::nanoseconds duration)
     return pauseOn(scheduler_, duration);
 }
 
+std::size_t SimulatedWorkQueues::itemCount() const
+{
+    std::size_t count = 0;
+    for (const auto& [key, queue] : registry_->queues) {
+        const auto held = queue.lock();
+        count += held ? held->itemCount() : 0;
+    }
+    return count;
+}
+
 void SimulatedWorkQueues::close()
 {
     registry_->closed = true;

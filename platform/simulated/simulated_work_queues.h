@@ -4,6 +4,7 @@
 #include "platform/simulated/simulated_scheduler.h"
 #include "platform/work_queues.h"
 
+#include <cstddef>
 #include <memory>
 #include <string>
 #include <unordered_map>
@@ -29,6 +30,8 @@ public:
     /// Drops all work, suspended work included, and takes no more. For tests whose suspended work refers
     /// to objects that go before the queues do.
     void close();
+    /// Items of all queues that wait, run or are suspended.
+    std::size_t itemCount() const;
 
 private:
     std::shared_ptr<SimulatedQueue> createQueue(std::string label, bool serial);

@@ -1,52 +1,100 @@
 #include "simulation/daemon_simulation.h"
 
+#include "platform/notifications.h"
 #include "simulation/simulated_clients.h"
 #include "simulation/world.h"
 
+#include <array>
 #include <chrono>
 
 // A run is a number of steps, each of which lets one client act or changes the device, posted so that the
 // scheduler mixes them with everything that the daemon does meanwhile. Every answer is judged as it arrives,
 // against the most its client may have been told; then the device is left in peace, and every client that is
-// still there checks in once more and must see exactly what is there.
+// still there checks in once more and must see exactly what is there. Every third daemon is killed in the
+// midst of it: a second one finds what was on the disk, and lives to the end.
 
 namespace typhon::simulation {
 
 namespace {
 
 constexpr std::uint64_t stepsOfARun = 120;
+constexpr std::uint64_t durationOfARun = 30'000;
 
-class Run {
+/// One daemon, from its start to its end.
+class Life {
 public:
-    explicit Run(std::uint64_t seed) : world_(seed) {}
+    Life(std::uint64_t seed, Defect defect) : world_(seed, defect) { begin(); }
+    Life(std::uint64_t seed, Defect defect, Life& before) : world_(seed, defect, before.world_) { begin(); }
 
-    Findings findings()
+    void live()
     {
-        startUp(*world_.daemon);
-        for (std::uint64_t step = 0; step < stepsOfARun; ++step) {
-            const std::chrono::milliseconds time(pick(30'000));
-            world_.simulated.scheduler.schedule(time, [this] { takeStep(); });
+        rest();
+        while (world_.simulated.userFontManager.finishNext()) {
+            rest();
         }
-        // Font requests pause, one after another, and who waits for a process waits for long.
-        world_.simulated.scheduler.advance(std::chrono::minutes(10));
         settle();
         leave();
-        return {world_.violations, world_.simulated.log.text()};
     }
+
+    /// Lives up to some moment, and ends without a chance to do anything about it.
+    void dieEarly()
+    {
+        bool isTime = false;
+        auto& scheduler = world_.simulated.scheduler;
+        scheduler.schedule(std::chrono::milliseconds(pick(durationOfARun)), [&isTime] { isTime = true; });
+        while (!isTime) {
+            scheduler.stepThroughTime();
+        }
+        for (auto steps = pick(60); steps != 0; --steps) {
+            scheduler.step();
+        }
+        isOver_ = true;
+        world_.simulated.queues.close();
+    }
+
+    Findings findings() const { return {world_.violations, world_.simulated.log.text()}; }
 
 private:
     std::uint64_t pick(std::uint64_t bound) { return world_.simulated.scheduler.pick(bound); }
 
+    void begin()
+    {
+        world_.simulated.userFontManager.holdOperations();
+        world_.simulated.fileSystem.setDuringRead([this](const std::string& /*path*/) {
+            if (pick(20) == 0) {
+                changeRegistry();
+            }
+        });
+        startUp(*world_.daemon);
+        for (std::uint64_t step = 0; step < stepsOfARun; ++step) {
+            const std::chrono::milliseconds time(pick(durationOfARun));
+            world_.simulated.scheduler.schedule(time, [this] {
+                if (!isOver_) {
+                    takeStep();
+                }
+            });
+        }
+    }
+
+    /// Font requests pause, one after another, and who waits for a process waits for long.
+    void rest() { world_.simulated.scheduler.advance(std::chrono::minutes(10)); }
+
     void takeStep()
     {
-        const auto what = pick(20);
+        const auto what = pick(24);
         if (what == 0) {
             changeRegistry();
         } else if (what < 3) {
             issueSomething();
         } else if (what == 3) {
             world_.simulated.preferences.setFailing(pick(2) == 0);
-        } else if (what < 7 || clients_.empty()) {
+        } else if (what == 4) {
+            removeApplication();
+        } else if (what < 7) {
+            world_.simulated.userFontManager.finishNext();
+        } else if (what == 7) {
+            administrate();
+        } else if (what < 11 || clients_.empty()) {
             addClient();
         } else {
             clients_[pick(clients_.size())]->act();
@@ -92,8 +140,30 @@ private:
         });
     }
 
+    /// The announcement, sound or not. The font manager answers late, and now and then with an error.
+    void removeApplication()
+    {
+        static const std::array identifiers{"com.example.reader", "com.example.provider",
+                                            "com.example.other"};
+        const PropertyList identifier = identifiers[pick(identifiers.size())];
+        if (pick(3) == 0) {
+            world_.simulated.userFontManager.failNext("out of order");
+        }
+        world_.simulated.notifications.deliverDistributed(
+            "com.vorlan.Startwell.applicationUnregistered",
+            PropertyList::Dictionary{
+                {"bundleIDs", pick(6) == 0 ? identifier : PropertyList::Array{identifier}}});
+    }
+
+    void administrate()
+    {
+        delay_ = static_cast<std::int64_t>(1 + pick(1000));
+        world_.changePreference("deleteDelay", *delay_);
+    }
+
     void settle()
     {
+        world_.simulated.fileSystem.setDuringRead(nullptr);
         world_.registry.repair();
         invalidate();
         world_.simulated.drain();
@@ -104,6 +174,9 @@ private:
         spreadTheWord();
         for (const auto& client : clients_) {
             client->judgeOutcomes();
+        }
+        if (delay_ && world_.simulated.preferences.durableValue("deleteDelay") != PropertyList(*delay_)) {
+            world_.report(invariants::flushed, "the preferences", "an administrator's change is lost");
         }
     }
 
@@ -126,29 +199,31 @@ private:
             client->disconnect();
         }
         world_.simulated.drain();
-        expectNone("connections", world_.simulated.ipc.connectionCount());
-        expectNone("failed reply handlers", world_.simulated.log.countContaining("reply handler failed"));
-        expectNone("observers", world_.daemon->notificationCenter().observerCount("fontChanged"));
-        expectNone("failed handlers", world_.simulated.log.countContaining("handler of "));
-        expectNone("replies that do not fit", world_.simulated.log.countContaining("does not fit"));
+        world_.judgeTheEnd();
     }
 
-    void expectNone(const std::string& what, std::size_t count)
-    {
-        if (count != 0) {
-            world_.report("the daemon", std::to_string(count) + " " + what + " at the end");
-        }
-    }
-
+    /// The steps that have not come yet are not taken any more.
+    bool isOver_ = false;
     World world_;
     std::vector<std::unique_ptr<SimulatedClient>> clients_;
+    std::optional<std::int64_t> delay_;
 };
 
 }  // namespace
 
-Findings simulateDaemon(std::uint64_t seed)
+Findings simulateDaemon(std::uint64_t seed, Defect defect)
 {
-    return Run(seed).findings();
+    Life first(seed, defect);
+    if (seed % 3 != 0) {
+        first.live();
+        return first.findings();
+    }
+    first.dieEarly();
+    Life second(~seed, defect, first);
+    second.live();
+    auto findings = second.findings();
+    findings.log.insert(0, first.findings().log + "killed, and started again\n");
+    return findings;
 }
 
 }  // namespace typhon::simulation

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "simulation/defects.h"
+
 #include <cstdint>
 #include <string>
 #include <vector>
@@ -14,8 +16,8 @@ struct Findings {
     std::string log;
 };
 
-/// Runs the daemon with several clients of all kinds on a device that changes under them. Everything
-/// follows from the seed.
-Findings simulateDaemon(std::uint64_t seed);
+/// Runs the daemon with several clients of all kinds on a device that changes under them; some daemons are
+/// killed and started again on what is left on the disk. Everything follows from the seed.
+Findings simulateDaemon(std::uint64_t seed, Defect defect = Defect::none);
 
 }  // namespace typhon::simulation

@@ -30,14 +30,14 @@ public:
         const auto now = simulated.scheduler.uptime();
         if (simulated.analytics.offered() != turns_) {
             if (simulated.analytics.offered() != turns_ + 1 || (turns_ != 0 && now - lastBegin_ < 1s)) {
-                world_.report("the gate", "two requests at once");
+                world_.report(invariants::oneAtATime, "the gate", "two requests at once");
             }
             turns_ = simulated.analytics.offered();
             lastBegin_ = now;
         }
         for (; dialogs_ < user_.dialogs(); ++dialogs_) {
             if (dialogs_ != 0 && !user_.hasAnswered(dialogs_ - 1)) {
-                world_.report("the gate", "a dialog while another one is up");
+                world_.report(invariants::oneAtATime, "the gate", "a dialog while another one is up");
             }
         }
     }
@@ -127,13 +127,14 @@ private:
             pass(1s);
         }
         if (inFlight() != 0) {
-            world_.report("the gate", std::to_string(inFlight()) + " requests never get their turn");
+            world_.report(invariants::oneAtATime, "the gate",
+                          std::to_string(inFlight()) + " requests never get their turn");
         }
     }
 
-    static Task<void> passGate(SimulatedPlatform* simulated, int* passed)
+    static Task<void> passGate(Platform* platform, int* passed)
     {
-        auto waiting = simulated->platform.requestGate.semaphore().wait();
+        auto waiting = platform->requestGate.semaphore().wait();
         co_await std::move(waiting);
         ++*passed;
     }
@@ -146,15 +147,16 @@ private:
         int passed = 0;
         const auto first = world_.simulated.queues.createSerialQueue("first at the gate");
         const auto second = world_.simulated.queues.createSerialQueue("second at the gate");
-        first->async(passGate(&world_.simulated, &passed));
-        second->async(passGate(&world_.simulated, &passed));
+        first->async(passGate(&world_.services->platform, &passed));
+        second->async(passGate(&world_.services->platform, &passed));
         world_.simulated.drain();
         if (passed != 1) {
-            world_.report("the gate", "lets " + std::to_string(passed) + " through instead of one");
+            world_.report(invariants::oneAtATime, "the gate",
+                          "lets " + std::to_string(passed) + " through instead of one");
         }
-        world_.simulated.platform.requestGate.semaphore().signal();
+        world_.services->platform.requestGate.semaphore().signal();
         world_.simulated.drain();
-        expectNone("lost gate", 2U - static_cast<unsigned>(passed));
+        world_.expectNone(invariants::oneAtATime, "lost gates", 2U - static_cast<unsigned>(passed));
     }
 
     void leave()
@@ -164,16 +166,7 @@ private:
         }
         user_.leave();
         world_.simulated.drain();
-        expectNone("connections", world_.simulated.ipc.connectionCount());
-        expectNone("failed handlers", world_.simulated.log.countContaining("handler of "));
-        expectNone("replies that do not fit", world_.simulated.log.countContaining("does not fit"));
-    }
-
-    void expectNone(const std::string& what, std::size_t count)
-    {
-        if (count != 0) {
-            world_.report("the daemon", std::to_string(count) + " " + what + " at the end");
-        }
+        world_.judgeTheEnd();
     }
 
     World world_;

@@ -115,7 +115,8 @@ void RequestingApplication::start(const wire::Operation& operation, Arguments ar
         [this, call](const IpcError& error) {
             ++call->outcomes;
             if (error.name != ipc_errors::disconnected) {
-                world_.report(name_, "a call failed: " + error.name + " " + error.message);
+                world_.report(invariants::oneAnswer, name_,
+                              "a call failed: " + error.name + " " + error.message);
             }
         });
 }
@@ -138,7 +139,7 @@ void RequestingApplication::judgeRequest(const Call& call, const PropertyList& f
     if (holds("app-usage") || holds("font-enumeration")) {
         judgeFonts(fonts, call.families, holds("font-enumeration"));
     } else if (!fonts.asDictionary()->empty()) {
-        world_.report(name_, "fonts for somebody who may not ask for any");
+        world_.report(invariants::share, name_, "fonts for somebody who may not ask for any");
     }
 }
 
@@ -162,7 +163,7 @@ void RequestingApplication::judgeFonts(const PropertyList& fonts, const std::set
     }
     const PropertyList reply = Dictionary{{"fontsInfo", fonts}};
     for (const auto& violation : violations(reply, allowed, world_.simulated.sandbox.issued())) {
-        world_.report(name_, violation);
+        world_.report(invariants::share, name_, violation);
     }
 }
 
@@ -171,7 +172,8 @@ void RequestingApplication::judgeOutcomes()
     for (const auto& call : calls_) {
         const int least = call->connection == connection_ ? 1 : 0;
         if (call->outcomes < least || call->outcomes > 1) {
-            world_.report(name_, "a call came to " + std::to_string(call->outcomes) + " outcomes");
+            world_.report(invariants::oneAnswer, name_,
+                          "a call came to " + std::to_string(call->outcomes) + " outcomes");
         }
     }
 }

@@ -10,7 +10,7 @@ namespace typhon::simulation {
 
 namespace {
 
-constexpr std::uint64_t defaultCount = 200;
+constexpr std::uint64_t defaultCount = TYPHON_DEFAULT_SEEDS;
 
 std::vector<std::uint64_t>& chosen()
 {

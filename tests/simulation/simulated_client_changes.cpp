@@ -29,7 +29,7 @@ void SimulatedClient::hear(const HeardChange& change)
         }
     }
     for (const auto& violation : violations(change, allowed, world_.simulated.sandbox.issued())) {
-        world_.report(name_, violation);
+        world_.report(invariants::share, name_, violation);
     }
 }
 
@@ -53,9 +53,10 @@ void SimulatedClient::judgeHearing()
         }
     }
     if (told != expected || heard_.size() != (expected.empty() ? 0U : 1U)) {
-        world_.report(name_, "heard of " + std::to_string(told.size()) + " fonts instead of " +
-                                 std::to_string(expected.size()) + " in " + std::to_string(heard_.size()) +
-                                 " messages");
+        world_.report(invariants::share, name_,
+                      "heard of " + std::to_string(told.size()) + " fonts instead of " +
+                          std::to_string(expected.size()) + " in " + std::to_string(heard_.size()) +
+                          " messages");
     }
 }
 
@@ -88,7 +89,7 @@ void SimulatedClient::judgeContent(const SimulatedContent& content, const std::o
         allowed.paths.insert(issued.begin(), issued.end());
     }
     for (const auto& violation : violations(info, allowed, world_.simulated.sandbox.issued())) {
-        world_.report(name_ + "'s content", violation);
+        world_.report(invariants::share, name_ + "'s content", violation);
     }
 }
 

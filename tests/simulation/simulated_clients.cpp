@@ -156,7 +156,8 @@ std::shared_ptr<SimulatedClient::Call> SimulatedClient::call(const wire::Operati
         const bool isExpected = error.name == ipc_errors::disconnected || expectedError == error.name ||
                                 (isGone_ && error.name == ipc_errors::accessDenied);
         if (!isExpected) {
-            world_.report(name_, made->member + " failed: " + error.name + " " + error.message);
+            world_.report(invariants::oneAnswer, name_,
+                          made->member + " failed: " + error.name + " " + error.message);
         }
     };
     connection_->call(
@@ -173,7 +174,7 @@ Task<void> SimulatedClient::judgeReply(SimulatedClient* self, std::shared_ptr<Ca
 {
     ++call->outcomes;
     if (isErrorExpected) {
-        self->world_.report(self->name_, call->member + " was answered");
+        self->world_.report(invariants::oneAnswer, self->name_, call->member + " was answered");
     }
     if (judge != nullptr) {
         (self->*judge)(results);
@@ -209,7 +210,7 @@ void SimulatedClient::judgeReplyBy(const Arguments& results, bool isEnumerating,
     const auto reply = wire::fromNullable(std::get<PropertyList>(results.at(0)));
     const auto allowed = allowance(isEnumerating, isGone_ ? reply.has_value() && isAnswered : isAnswered);
     for (const auto& violation : violations(reply, allowed, world_.simulated.sandbox.issued())) {
-        world_.report(name_, violation);
+        world_.report(invariants::share, name_, violation);
     }
 }
 
@@ -249,8 +250,9 @@ void SimulatedClient::judgeExactly(const Arguments& results)
         listed.insert(path);
     }
     if (reply && listed != exactPaths()) {
-        world_.report(name_, "sees " + std::to_string(listed.size()) + " fonts instead of " +
-                                 std::to_string(exactPaths().size()));
+        world_.report(invariants::share, name_,
+                      "sees " + std::to_string(listed.size()) + " fonts instead of " +
+                          std::to_string(exactPaths().size()));
     }
 }
 
@@ -271,7 +273,8 @@ void SimulatedClient::judgeOutcomes()
         const int least = isStillConnected && !call->isNeverAnswered ? 1 : 0;
         const int most = isStillConnected && call->isNeverAnswered ? 0 : 1;
         if (call->outcomes < least || call->outcomes > most) {
-            world_.report(name_, call->member + " came to " + std::to_string(call->outcomes) + " outcomes");
+            world_.report(invariants::oneAnswer, name_,
+                          call->member + " came to " + std::to_string(call->outcomes) + " outcomes");
         }
     }
 }

@@ -83,6 +83,16 @@ void SimulatedRegistry::repair()
     write();
 }
 
+void SimulatedRegistry::continueFrom(const SimulatedRegistry& other)
+{
+    fonts_ = other.fonts_;
+    isUnreadable_ = other.isUnreadable_;
+    everEnabled_ = other.everEnabled_;
+    everEnabledWith_ = other.everEnabledWith_;
+    everDisabledWith_ = other.everDisabledWith_;
+    write();
+}
+
 std::set<std::string> SimulatedRegistry::enabled() const
 {
     std::set<std::string> paths;

@@ -22,6 +22,9 @@ public:
     /// Makes the file readable again, if it is not.
     void repair();
 
+    /// Takes over what was on the disk of another device, with its past, and writes it.
+    void continueFrom(const SimulatedRegistry& other);
+
     /// The path of some font, installed or not.
     std::string somePath();
 
