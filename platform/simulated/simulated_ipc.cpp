@@ -117,6 +117,16 @@ void SimulatedIpc::endProcess(const AuditToken& token)
     }
 }
 
+void SimulatedIpc::endAllProcesses()
+{
+    for (const auto& listener : std::vector(machine_->resumedListeners)) {
+        listener->invalidate();
+    }
+    for (const auto& connection : std::vector(machine_->resumedConnections)) {
+        connection->die();
+    }
+}
+
 std::size_t SimulatedIpc::connectionCount() const
 {
     return machine_->resumedConnections.size();

@@ -39,6 +39,8 @@ public:
     /// Ends a process: its listeners and its ends of connections go, without any of its handlers being
     /// called.
     void endProcess(const AuditToken& token);
+    /// The same for all processes at once.
+    void endAllProcesses();
 
     /// Ends of connections that are resumed and not yet invalidated, of all processes.
     std::size_t connectionCount() const;

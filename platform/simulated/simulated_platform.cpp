@@ -41,6 +41,12 @@ SimulatedPlatform::~SimulatedPlatform()
     queues.close();
 }
 
+void SimulatedPlatform::losePower()
+{
+    queues.close();
+    ipc.endAllProcesses();
+}
+
 void SimulatedPlatform::runAs(const AuditToken& token, Task<void> work)
 {
     const auto pair = connect(token);

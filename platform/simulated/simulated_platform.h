@@ -45,6 +45,10 @@ public:
     /// Runs everything there is to run at the present virtual time.
     void drain() { scheduler.runUntilIdle(); }
 
+    /// The power fails: nothing runs any more, and everybody lets go of what was to run. Not from within
+    /// work.
+    void losePower();
+
     /// Runs `work` on a queue of its own, and everything that follows from it. Aborts if the work never ends;
     /// throws what it threw.
     void run(Task<void> work) { runOn(nullptr, std::move(work)); }

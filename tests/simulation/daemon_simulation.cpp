@@ -49,7 +49,7 @@ public:
             scheduler.step();
         }
         isOver_ = true;
-        world_.simulated.queues.close();
+        world_.simulated.losePower();
     }
 
     Findings findings() const { return {world_.violations, world_.simulated.log.text()}; }
