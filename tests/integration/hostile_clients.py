@@ -246,6 +246,26 @@ def many_descriptors(path, count):
     tell(closed=closed)
 
 
+def hidden_descriptors(path, count):
+    """Sends an invalid message, and right behind it another one with descriptors."""
+    null = os.open("/dev/null", os.O_RDONLY)
+    large = 8 << 10
+    first = message("no interface", "checkin", "s", struct.pack("<I", large) + bytes(large) + b"\0")
+    second = message("no interface", "checkin", descriptors=253)
+    closed = 0
+    # Enough before them that both are there when the daemon comes to them.
+    before = message(TYPHON, "updatingUserFonts") * 40
+    for _ in range(count):
+        client = Hostile(path)
+        try:
+            client.socket.sendall(before + first)
+            client.send(second, [null] * 253)
+        except ConnectionError:
+            pass
+        closed += client.await_end()
+    tell(closed=closed)
+
+
 def never_answered(path, count):
     """Calls the operation that is never answered, and now and then one that is."""
     client = Hostile(path)

@@ -194,6 +194,15 @@ class HostileClients(unittest.TestCase):
         self.assert_bounds_hold()
         eventually(lambda: self.descriptors() <= before)
 
+    def test_one_that_hides_descriptors_behind_an_invalid_message(self):
+        before = self.descriptors()
+        process = self.hostile("hidden_descriptors", 100)
+        self.assert_others_are_served()
+        self.assertEqual(process.tells(), {"closed": 100})
+        self.assert_logged_once("it sent something that is no message")
+        self.assert_bounds_hold()
+        eventually(lambda: self.descriptors() <= before)
+
     def test_one_that_calls_what_is_never_answered(self):
         before = self.memory()
         process = self.hostile("never_answered", NEVER_ANSWERED_CALLS)
