@@ -21,9 +21,9 @@ public:
     /// `allowPlaceholder` is false.
     virtual std::optional<SWApplicationRecord> record(const std::string& bundleIdentifier,
                                                       bool allowPlaceholder) = 0;
-    /// True when that application is certainly not installed: everything that could describe it was looked at,
-    /// and nothing does, or only as a placeholder. False also when that cannot be told just now, so that `record`
-    /// may be null and this false.
+    /// True when that application is certainly not installed: everything that could describe it was looked
+    /// at, and nothing does, or only as a placeholder. False also when that cannot be told just now, so that
+    /// `record` may be null and this false.
     virtual bool isKnownToBeAbsent(const std::string& bundleIdentifier) = 0;
 };
 
