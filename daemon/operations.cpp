@@ -136,20 +136,19 @@ Task<void> sendFonts(TyphonDaemonProtocol& object, Call call)
 }
 
 using enum Admission;
-using enum Availability;
 
 constexpr std::array table{
-    DispatchedOperation{wire::checkin, everyone, served, checkin},
-    DispatchedOperation{wire::checkinForFontPicker, everyone, served, checkinForFontPicker},
-    DispatchedOperation{wire::requestFonts, everyone, served, requestFonts},
-    DispatchedOperation{wire::requestFontsForClient, fontPicker, served, requestFontsForClient},
-    DispatchedOperation{wire::fontChanged, everyone, served, fontChanged},
-    DispatchedOperation{wire::updatingUserFonts, everyone, served, updatingUserFonts},
-    DispatchedOperation{wire::scheduleFontFilesDeletion, everyone, served, scheduleFontFilesDeletion},
-    DispatchedOperation{wire::synchronizeFontAssets, everyone, toCome, synchronizeFontAssets},
-    DispatchedOperation{wire::resetIssuedFontsFor, everyone, served, resetIssuedFontsFor},
-    DispatchedOperation{wire::checkinForSilkpageProcess, everyone, served, checkinForSilkpageProcess},
-    DispatchedOperation{wire::sendFonts, everyone, served, sendFonts},
+    DispatchedOperation{wire::checkin, everyone, checkin},
+    DispatchedOperation{wire::checkinForFontPicker, everyone, checkinForFontPicker},
+    DispatchedOperation{wire::requestFonts, everyone, requestFonts},
+    DispatchedOperation{wire::requestFontsForClient, fontPicker, requestFontsForClient},
+    DispatchedOperation{wire::fontChanged, everyone, fontChanged},
+    DispatchedOperation{wire::updatingUserFonts, everyone, updatingUserFonts},
+    DispatchedOperation{wire::scheduleFontFilesDeletion, everyone, scheduleFontFilesDeletion},
+    DispatchedOperation{wire::synchronizeFontAssets, everyone, synchronizeFontAssets},
+    DispatchedOperation{wire::resetIssuedFontsFor, everyone, resetIssuedFontsFor},
+    DispatchedOperation{wire::checkinForSilkpageProcess, everyone, checkinForSilkpageProcess},
+    DispatchedOperation{wire::sendFonts, everyone, sendFonts},
 };
 
 const DispatchedOperation* find(std::string_view interface, std::string_view member)
@@ -176,10 +175,6 @@ Task<void> dispatch(std::shared_ptr<TyphonHandler> handler, std::shared_ptr<Inco
     }
     if (row->admission == fontPicker && !handler->server()->isCurrentConnectionFontPicker()) {
         call->fail({ipc_errors::accessDenied, call->member() + " is for the font picker only"});
-        co_return;
-    }
-    if (row->availability == toCome) {
-        call->fail({ipc_errors::notSupported, call->member() + " is not supported by this version"});
         co_return;
     }
     auto handling = row->handler(*handler, call);

@@ -13,14 +13,10 @@ namespace typhon {
 /// Who may use an operation. Others get `AccessDenied`, before anything else is looked at.
 enum class Admission { everyone, fontPicker };
 
-/// Whether an operation is served yet. Those to come answer `NotSupported`.
-enum class Availability { served, toCome };
-
 /// One row of the dispatch table.
 struct DispatchedOperation {
     wire::Operation operation;
     Admission admission;
-    Availability availability;
     /// Decodes the arguments, calls the operation and encodes its reply. `object` outlives the task.
     Task<void> (*handler)(TyphonDaemonProtocol& object, std::shared_ptr<IncomingCall> call);
 };

@@ -73,24 +73,6 @@ TEST_F(OperationsTest, TheTableHoldsExactlyWhatConnectionsExport)
     EXPECT_EQ(dispatched, exported);
 }
 
-TEST_F(OperationsTest, TheOperationsToComeAreThese)
-{
-    std::set<std::string> toCome;
-    for (const auto& row : dispatchTable()) {
-        if (row.availability == Availability::toCome) {
-            toCome.insert(row.operation.member);
-        }
-    }
-    EXPECT_EQ(toCome, (std::set<std::string>{"synchronizeFontAssets_reply"}));
-}
-
-TEST_F(OperationsTest, OperationsToComeAnswerNotSupported)
-{
-    const Arguments list{PropertyList(PropertyList::Array{})};
-    const Outcomes notSupported{ipc_errors::notSupported};
-    EXPECT_EQ(outcomesOf(wire::synchronizeFontAssets, list), notSupported);
-}
-
 TEST_F(OperationsTest, RequestingFontsForAClientIsForTheFontPickerOnly)
 {
     const Arguments arguments{PropertyList("Alpha"), simulated.ipc.anonymousListener()->endpoint()};
@@ -117,6 +99,7 @@ TEST_F(OperationsTest, ServedOperationsAnswerOnce)
     EXPECT_EQ(outcomesOf(wire::scheduleFontFilesDeletion, {PropertyList(PropertyList::Array{})}), one);
     EXPECT_EQ(outcomesOf(wire::resetIssuedFontsFor, {PropertyList("com.example.app")}), one);
     EXPECT_EQ(outcomesOf(wire::requestFonts, {PropertyList(PropertyList::Array{})}), one);
+    EXPECT_EQ(outcomesOf(wire::synchronizeFontAssets, {PropertyList(PropertyList::Array{})}), one);
 }
 
 TEST_F(OperationsTest, SendFontsNeverAnswers)
@@ -139,8 +122,6 @@ TEST_F(OperationsTest, TheDaemonItselfDoesNotKnowWhatItDoesNotImplement)
     EXPECT_TRUE(isUnknown(daemon->checkin(nobody)));
     EXPECT_TRUE(isUnknown(daemon->checkinForFontPicker(nobody)));
     EXPECT_TRUE(isUnknown(daemon->sendFonts({}, [] {})));
-    EXPECT_TRUE(
-        isUnknown(daemon->synchronizeFontAssets({}, [](bool, const std::optional<PropertyList>&) {})));
     EXPECT_TRUE(isUnknown(daemon->checkinForSilkpageProcess(nullptr, [] {})));
 }
 

@@ -48,7 +48,15 @@ TyphonDaemon::TyphonDaemon(Platform& platform)
       applicationRemoval_(
           std::make_shared<ApplicationRemoval>(platform, issuedPathsLedger_, *mainHandlerQueue_)),
       scheduledFontDeletion_(std::make_shared<ScheduledFontDeletion>(
-          platform, [removal = applicationRemoval_] { removal->sweepStrayEntries(); }))
+          platform, [removal = applicationRemoval_] { removal->sweepStrayEntries(); })),
+      assetSynchronisation_(platform, perClientFontInfo_, *mainHandlerQueue_), obsoleteAssetPurge_(platform),
+      fontAccessPrivacyAsset_(platform),
+      assetCatalogueEvents_(std::make_shared<AssetCatalogueEvents>(
+          platform, userFontRegistry_,
+          AssetCatalogueEvents::Reactions{
+              .purgeObsoleteAssets = [this] { obsoleteAssetPurge_.purgeObsoleteAssets(); },
+              .loadFontAccessPrivacyAsset = [this] { loadFontAccessPrivacyAsset(); }})),
+      assetDirectoryMonitoring_(std::make_shared<AssetDirectoryMonitoring>(platform))
 {}
 
 void TyphonDaemon::setupForSluiceService()
@@ -72,12 +80,21 @@ void TyphonDaemon::setupForDistributedNotifications()
 
 void TyphonDaemon::setupForAssetNotifications()
 {
-    assetCatalogueEvents_.setupForAssetNotifications();
+    assetCatalogueEvents_->setupForAssetNotifications();
 }
 
 void TyphonDaemon::setupForMonitoringFontAssets()
 {
-    assetDirectoryMonitoring_.setupForMonitoringFontAssets();
+    assetDirectoryMonitoring_->setupForMonitoringFontAssets();
+}
+
+void TyphonDaemon::loadFontAccessPrivacyAsset()
+{
+    fontAccessPrivacyAsset_.load([weak = weak_from_this()](PropertyList list) {
+        if (const auto self = weak.lock()) {
+            self->clientCapabilities_.setFontEnumerationProhibitedInfo(std::move(list));
+        }
+    });
 }
 
 void TyphonDaemon::setupForProfileFonts()
@@ -166,9 +183,9 @@ Task<void> TyphonDaemon::scheduleFontFilesDeletion(std::vector<std::string> path
     return scheduledFontDeletion_->scheduleFontFilesDeletion(std::move(paths));
 }
 
-Task<void> TyphonDaemon::synchronizeFontAssets(std::vector<std::string> /*paths*/, OutcomeReply /*reply*/)
+Task<void> TyphonDaemon::synchronizeFontAssets(std::vector<std::string> paths, OutcomeReply reply)
 {
-    return doesNotRecognizeSelector("synchronizeFontAssets:reply:");
+    return assetSynchronisation_.synchronizeFontAssets(std::move(paths), std::move(reply));
 }
 
 Task<void> TyphonDaemon::checkinForSilkpageProcess(std::shared_ptr<ListenerEndpoint> /*endpoint*/,

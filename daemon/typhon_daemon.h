@@ -2,6 +2,8 @@
 
 #include "assets/asset_catalogue_events.h"
 #include "assets/asset_directory_monitoring.h"
+#include "assets/asset_synchronisation.h"
+#include "assets/font_access_privacy_asset.h"
 #include "assets/obsolete_asset_purge.h"
 #include "clients/typhon_server.h"
 #include "daemon/client_capabilities.h"
@@ -69,25 +71,27 @@ public:
     FontNameResolution& fontNameResolution() { return fontNameResolution_; }
     MissingFontsDialog& missingFontsDialog() { return missingFontsDialog_; }
     FontRequests& fontRequests() { return fontRequests_; }
+    AssetCatalogueEvents& assetCatalogueEvents() { return *assetCatalogueEvents_; }
 
     Task<void> requestFonts(PropertyList::Array requests, DictionaryReply reply) override;
     Task<void> requestFonts(std::string postScriptName, std::shared_ptr<ListenerEndpoint> forClient,
                             BooleanReply reply) override;
     Task<void> fontChanged(PropertyList change, EmptyReply reply) override;
     Task<void> updatingUserFonts(EmptyReply reply) override;
+    Task<void> synchronizeFontAssets(std::vector<std::string> paths, OutcomeReply reply) override;
     Task<void> resetIssuedFontsFor(std::string identifier, EmptyReply reply) override;
 
-    // Answered by each client's handler, or not implemented yet: these throw, like a message to an object
-    // that does not know it. The dispatch table lets none of them through.
+    // Answered by each client's handler: these throw, like a message to an object that does not know it. The dispatch table lets none of them through.
     Task<void> checkin(OptionalDictionaryReply reply) override;
     Task<void> checkinForFontPicker(OptionalDictionaryReply reply) override;
     Task<void> sendFonts(PropertyList::Array fonts, EmptyReply reply) override;
     Task<void> scheduleFontFilesDeletion(std::vector<std::string> paths) override;
-    Task<void> synchronizeFontAssets(std::vector<std::string> paths, OutcomeReply reply) override;
     Task<void> checkinForSilkpageProcess(std::shared_ptr<ListenerEndpoint> endpoint,
                                          EmptyReply reply) override;
 
 private:
+    void loadFontAccessPrivacyAsset();
+
     Platform& platform_;
     std::shared_ptr<WorkQueue> mainHandlerQueue_;
     NotificationCenter notificationCenter_;
@@ -103,9 +107,11 @@ private:
     FontChangeBroadcast fontChangeBroadcast_;
     const std::shared_ptr<ApplicationRemoval> applicationRemoval_;
     const std::shared_ptr<ScheduledFontDeletion> scheduledFontDeletion_;
-    AssetCatalogueEvents assetCatalogueEvents_;
-    AssetDirectoryMonitoring assetDirectoryMonitoring_;
+    AssetSynchronisation assetSynchronisation_;
     ObsoleteAssetPurge obsoleteAssetPurge_;
+    FontAccessPrivacyAsset fontAccessPrivacyAsset_;
+    const std::shared_ptr<AssetCatalogueEvents> assetCatalogueEvents_;
+    const std::shared_ptr<AssetDirectoryMonitoring> assetDirectoryMonitoring_;
 };
 
 }  // namespace typhon

@@ -2,8 +2,11 @@
 
 #include "platform/analytics.h"
 #include "platform/application_registry.h"
+#include "platform/asset_service.h"
+#include "platform/background_activity.h"
 #include "platform/clock.h"
 #include "platform/code_signing.h"
+#include "platform/file_events.h"
 #include "platform/file_system.h"
 #include "platform/ipc.h"
 #include "platform/log.h"
@@ -84,6 +87,9 @@ struct Platform {
     RemoteAlerts& remoteAlerts;
     Analytics& analytics;
     Notifications& notifications;
+    AssetService& assetService;
+    FileEvents& fileEvents;
+    BackgroundActivities& backgroundActivities;
     /// The internal-build query: whether this is an internal build of the system.
     bool isInternalBuild = false;
 

@@ -49,6 +49,9 @@ public:
     virtual void synchronizeFontProviders() = 0;
     /// `synchronizeProfileFonts:`. Brings profile-installed fonts up to date.
     virtual void synchronizeProfileFonts(std::function<void()> completion) = 0;
+    /// `synchronizeFontAssets:`. Brings the font-asset directory and the registry in step with the asset store;
+    /// false when that failed, in whole or in part.
+    virtual void synchronizeFontAssets(std::function<void(bool)> completion) = 0;
 };
 
 }  // namespace typhon

@@ -3,8 +3,11 @@
 #include "platform/platform.h"
 #include "platform/simulated/simulated_analytics.h"
 #include "platform/simulated/simulated_application_registry.h"
+#include "platform/simulated/simulated_asset_service.h"
+#include "platform/simulated/simulated_background_activities.h"
 #include "platform/simulated/simulated_clock.h"
 #include "platform/simulated/simulated_code_signing.h"
+#include "platform/simulated/simulated_file_events.h"
 #include "platform/simulated/simulated_file_system.h"
 #include "platform/simulated/simulated_ipc.h"
 #include "platform/simulated/simulated_log.h"
@@ -74,6 +77,9 @@ public:
     SimulatedProcessLifecycle processLifecycle{processes};
     SimulatedAnalytics analytics{scheduler};
     SimulatedNotifications notifications;
+    SimulatedAssetService assetService{scheduler};
+    SimulatedFileEvents fileEvents{scheduler};
+    SimulatedBackgroundActivities backgroundActivities;
 
 private:
     std::unique_ptr<SimulatedIpc> ownedIpc_ = std::make_unique<SimulatedIpc>(queues, log);
@@ -83,7 +89,8 @@ public:
     SimulatedRemoteAlerts remoteAlerts{ipc};
     Platform platform{queues,           clock,        ipc,       codeSigning,         sandbox,
                       preferences,      fileSystem,   log,       applicationRegistry, userFontManager,
-                      processLifecycle, remoteAlerts, analytics, notifications};
+                      processLifecycle, remoteAlerts, analytics, notifications,       assetService,
+                      fileEvents,       backgroundActivities};
 
 private:
     void runOn(std::shared_ptr<void> connection, Task<void> work);

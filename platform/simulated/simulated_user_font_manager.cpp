@@ -1,6 +1,7 @@
 #include "platform/simulated/simulated_user_font_manager.h"
 
 #include "platform/file_url.h"
+#include "platform/font_directories.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -186,6 +187,23 @@ void SimulatedUserFontManager::synchronizeProfileFonts(std::function<void()> com
 {
     ++profileSynchronizations_;
     pending_.push_back(std::move(completion));
+}
+
+void SimulatedUserFontManager::synchronizeFontAssets(std::function<void(bool)> completion)
+{
+    calls_.push_back("synchronizeFontAssets");
+    start([this, completion = std::move(completion)] {
+        const auto error = change([&](PropertyList::Dictionary& entries) -> FontManagerError {
+            std::erase_if(entries, [](const auto& pair) {
+                return std::string_view(pair.first).starts_with(font_directories::fontAssets);
+            });
+            entries.insert(fontAssets_.begin(), fontAssets_.end());
+            return std::nullopt;
+        });
+        if (completion) {
+            completion(!error);
+        }
+    });
 }
 
 void SimulatedUserFontManager::finishProfileSynchronizations()

@@ -33,12 +33,15 @@ public:
         std::string identifier, std::function<void(FontManagerError)> completionHandler) override;
     void synchronizeFontProviders() override { calls_.push_back("synchronizeFontProviders"); }
     void synchronizeProfileFonts(std::function<void()> completion) override;
+    void synchronizeFontAssets(std::function<void(bool)> completion) override;
 
     /// How often `synchronizeProfileFonts` was called.
     std::size_t profileSynchronizations() const { return profileSynchronizations_; }
     /// Calls the completions of all synchronisations that are under way, in order.
     void finishProfileSynchronizations();
 
+    /// The registry entries, by path, that the next synchronisations of font assets find in the asset store.
+    void setFontAssets(PropertyList::Dictionary entries) { fontAssets_ = std::move(entries); }
     void setProfileFontsInfo(PropertyList fonts) { profileFonts_ = std::move(fonts); }
     /// Has the next operation fail with that error, and change nothing.
     void failNext(std::string error) { nextError_ = std::move(error); }
@@ -60,6 +63,7 @@ private:
     SimulatedScheduler& scheduler_;
     SimulatedFileSystem& fileSystem_;
     PropertyList profileFonts_ = PropertyList::Dictionary{};
+    PropertyList::Dictionary fontAssets_;
     std::size_t profileSynchronizations_ = 0;
     std::vector<std::function<void()>> pending_;
     std::optional<std::string> nextError_;
