@@ -9,8 +9,11 @@
 #include "platform/linux/identities_service.h"
 #include "platform/linux/linux_analytics.h"
 #include "platform/linux/linux_application_registry.h"
+#include "platform/linux/linux_asset_service.h"
+#include "platform/linux/linux_background_activities.h"
 #include "platform/linux/linux_clock.h"
 #include "platform/linux/linux_code_signing.h"
+#include "platform/linux/linux_file_events.h"
 #include "platform/linux/linux_file_system.h"
 #include "platform/linux/linux_ipc.h"
 #include "platform/linux/linux_log.h"
@@ -31,6 +34,7 @@
 
 #include <filesystem>
 #include <map>
+#include <random>
 #include <string>
 
 #include <CLI/CLI.hpp>
@@ -50,6 +54,13 @@ struct Options {
     bool isInternalBuild = false;
 };
 
+/// A number in [0, 1).
+double randomFraction()
+{
+    std::random_device device;
+    return std::uniform_real_distribution<double>()(device);
+}
+
 /// The services of Linux, each after those it stands on.
 struct LinuxServices {
     explicit LinuxServices(const Options& options)
@@ -68,6 +79,10 @@ struct LinuxServices {
     LinuxUserFontManager userFontManager{root, log};
     LinuxAnalytics analytics{root, log};
     LinuxNotifications notifications{pool, queues, log, root};
+    LinuxAssetService assetService{pool, log, root};
+    LinuxFileEvents fileEvents{pool, queues, log, root};
+    LinuxBackgroundActivities backgroundActivities{
+        {.queues = queues, .clock = clock, .log = log, .random = randomFraction}, root};
 
     ConfinementProbe probe;
     SignatureStore signatures{root, log};
@@ -124,6 +139,9 @@ void run(const Options& options)
                              .remoteAlerts = services.remoteAlerts,
                              .analytics = services.analytics,
                              .notifications = services.notifications,
+                             .assetService = services.assetService,
+                             .fileEvents = services.fileEvents,
+                             .backgroundActivities = services.backgroundActivities,
                              .isInternalBuild = options.isInternalBuild};
 
     logProcessIdentity(services.log);

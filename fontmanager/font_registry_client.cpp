@@ -133,4 +133,10 @@ ClientResult<Done> FontRegistryClient::synchronizeProfileFonts()
     return results ? ClientResult<Done>(Done{}) : ClientResult<Done>(results.error());
 }
 
+ClientResult<Done> FontRegistryClient::synchronizeFontAssets()
+{
+    const auto results = call(font_registry_wire::synchronizeFontAssets, {});
+    return results ? ClientResult<Done>(Done{}) : ClientResult<Done>(results.error());
+}
+
 }  // namespace typhon

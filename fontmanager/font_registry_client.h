@@ -49,6 +49,7 @@ public:
 
     ClientResult<Done> synchronizeFontProviders();
     ClientResult<Done> synchronizeProfileFonts();
+    ClientResult<Done> synchronizeFontAssets();
 
 private:
     explicit FontRegistryClient(ServiceConnection helper) : helper_(std::move(helper)) {}

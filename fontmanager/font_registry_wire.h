@@ -25,5 +25,6 @@ inline constexpr wire::Operation enableOrDisable{interface, "enableOrDisablePers
                                                  "x"};
 inline constexpr wire::Operation synchronizeFontProviders{interface, "synchronizeFontProviders", "", ""};
 inline constexpr wire::Operation synchronizeProfileFonts{interface, "synchronizeProfileFonts", "", ""};
+inline constexpr wire::Operation synchronizeFontAssets{interface, "synchronizeFontAssets", "", ""};
 
 }  // namespace typhon::font_registry_wire

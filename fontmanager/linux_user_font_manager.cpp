@@ -114,6 +114,19 @@ void LinuxUserFontManager::synchronizeProfileFonts(std::function<void()> complet
           });
 }
 
+void LinuxUserFontManager::synchronizeFontAssets(std::function<void(bool)> completion)
+{
+    start([](FontRegistryClient& client) { return errorOf(client.synchronizeFontAssets()); },
+          [this, completion = std::move(completion)](const FontManagerError& error) {
+              if (error) {
+                  TYLog_Error(log_, "font assets were not synchronised: " + *error);
+              }
+              if (completion) {
+                  completion(!error);
+              }
+          });
+}
+
 FontManagerError LinuxUserFontManager::perform(const Operation& operation) const
 {
     if (!operation) {

@@ -37,6 +37,7 @@ public:
         std::string identifier, std::function<void(FontManagerError)> completionHandler) override;
     void synchronizeFontProviders() override;
     void synchronizeProfileFonts(std::function<void()> completion) override;
+    void synchronizeFontAssets(std::function<void(bool)> completion) override;
 
 private:
     /// An operation at the helper; null when it succeeded.

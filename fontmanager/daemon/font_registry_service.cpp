@@ -43,7 +43,7 @@ InterfaceDescriptions FontRegistryService::interfaces()
         for (const auto& operation :
              {beginRegistration, addFontFile, commitRegistration, cancelRegistration, unregister,
               unregisterAll, enableOrDisable, font_registry_wire::synchronizeFontProviders,
-              font_registry_wire::synchronizeProfileFonts}) {
+              font_registry_wire::synchronizeProfileFonts, font_registry_wire::synchronizeFontAssets}) {
             description.members.push_back({operation.member, operation.inTypes, operation.outTypes, true});
         }
         return std::make_shared<const std::vector<InterfaceDescription>>(

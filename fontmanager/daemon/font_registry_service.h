@@ -2,6 +2,7 @@
 
 #include "fontmanager/daemon/caller_identity.h"
 #include "fontmanager/daemon/change_reports.h"
+#include "fontmanager/font_assets.h"
 #include "fontmanager/font_store.h"
 #include "fontmanager/profile_fonts.h"
 #include "platform/ipc.h"
@@ -22,6 +23,7 @@ public:
     struct Parts {
         FontStore& store;
         ProfileFonts& profileFonts;
+        FontAssets& fontAssets;
         CallerIdentities& identities;
         ChangeReports& reports;
         Log& log;

@@ -101,6 +101,7 @@ Task<void> FontRegistrySession::handle(Self self, AuditToken caller, Call call)
         Row{font_registry_wire::enableOrDisable.member, enableOrDisable},
         Row{font_registry_wire::synchronizeFontProviders.member, synchronizeFontProviders},
         Row{font_registry_wire::synchronizeProfileFonts.member, synchronizeProfileFonts},
+        Row{font_registry_wire::synchronizeFontAssets.member, synchronizeFontAssets},
     };
     for (const auto& row : table) {
         if (call->member() == row.member) {
@@ -297,6 +298,25 @@ Task<void> FontRegistrySession::synchronizeProfileFonts(Self self, AuditToken ca
     auto outcome = parts.profileFonts.synchronize();
     Task<void> reporting = parts.reports.report(std::move(outcome.change), ChangeReports::Kind::profileFonts);
     co_await std::move(reporting);
+    if (outcome.error) {
+        call->fail({ipc_errors::failed, *outcome.error});
+    } else {
+        call->reply({});
+    }
+}
+
+Task<void> FontRegistrySession::synchronizeFontAssets(Self self, AuditToken caller, Call call)
+{
+    Task<Permission> asking = permissionOf(self, caller);
+    const auto permission = co_await std::move(asking);
+    if (permission.error || !permission.everybody) {
+        call->fail(permission.error.value_or(denied("that is for the daemon and administrators")));
+        co_return;
+    }
+    std::function<RegistryChangeOutcome(FontStore&)> work =
+        [&fontAssets = self->service_->parts().fontAssets](FontStore&) { return fontAssets.synchronize(); };
+    Task<RegistryChangeOutcome> changing = change(self, std::move(work));
+    const auto outcome = co_await std::move(changing);
     if (outcome.error) {
         call->fail({ipc_errors::failed, *outcome.error});
     } else {

@@ -47,6 +47,7 @@ private:
     static Task<void> enableOrDisable(Self self, AuditToken caller, Call call);
     static Task<void> synchronizeFontProviders(Self self, AuditToken caller, Call call);
     static Task<void> synchronizeProfileFonts(Self self, AuditToken caller, Call call);
+    static Task<void> synchronizeFontAssets(Self self, AuditToken caller, Call call);
 
     /// Changes the fonts, with the reports before and after it, and tells how it went.
     static Task<RegistryChangeOutcome> change(Self self,

@@ -57,6 +57,7 @@ struct Helper {
     ReadFontNames readNames = [this](int descriptor) { return parser.read(descriptor); };
     FontStore store{root, readNames, log};
     ProfileFonts profileFonts{root, readNames, log};
+    FontAssets fontAssets{root, readNames, log};
 };
 
 Options parsed(int argc, char** argv)
@@ -127,6 +128,7 @@ int run(const Options& options)
     const auto service = std::make_shared<FontRegistryService>(
         FontRegistryService::Parts{.store = helper.store,
                                    .profileFonts = helper.profileFonts,
+                                   .fontAssets = helper.fontAssets,
                                    .identities = helper.identities,
                                    .reports = helper.reports,
                                    .log = helper.log},

@@ -101,12 +101,14 @@ class RunningService {
 public:
     explicit RunningService(const RootDirectory& root, ReadFontNames readNames)
         : store(root, readNames, log), profileFonts(root, readNames, log),
+          fontAssets(root, readNames, log),
           ipc(pool, queues, log, root, instanceOfPeer, IpcLimits{}, EndpointHandshake::client)
     {
         openError = store.open().error;
         service =
             std::make_shared<FontRegistryService>(FontRegistryService::Parts{.store = store,
                                                                              .profileFonts = profileFonts,
+                                                                             .fontAssets = fontAssets,
                                                                              .identities = identities,
                                                                              .reports = reports,
                                                                              .log = log},
@@ -129,6 +131,7 @@ public:
     KeptReports reports;
     FontStore store;
     ProfileFonts profileFonts;
+    FontAssets fontAssets;
     LinuxIpc ipc;
     std::optional<std::string> openError;
     std::shared_ptr<FontRegistryService> service;

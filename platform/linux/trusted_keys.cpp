@@ -30,7 +30,7 @@ bool TrustedKeys::Seen::isSettled() const
 
 bool TrustedKeys::isUnchanged() const
 {
-    const auto directory = root_.real(trustedKeysDirectory);
+    const auto directory = root_.real(directory_);
     return stateOf(directory) == seen_.directory && std::ranges::all_of(seen_.files, [&](const auto& file) {
                return stateOf(directory + "/" + file.first) == file.second;
            });
@@ -47,10 +47,10 @@ TrustedKeys::Snapshot TrustedKeys::current()
 
 void TrustedKeys::load()
 {
-    const auto directoryPath = root_.real(trustedKeysDirectory);
+    const auto directoryPath = root_.real(directory_);
     Seen seen{stateOf(directoryPath), {}};
     auto keys = std::make_shared<std::vector<TrustedKey>>();
-    const auto directory = TrustedDirectory::open(root_, trustedKeysDirectory);
+    const auto directory = TrustedDirectory::open(root_, directory_);
     std::vector<std::string> complaints;
     if (!directory.value) {
         complaints.push_back(directory.error);

@@ -13,15 +13,17 @@
 
 namespace typhon {
 
-/// The keys in /etc/typhon/trusted-keys.d, as they are now: a file that was added, changed or removed counts
+/// The keys in a directory, as they are now: a file that was added, changed or removed counts
 /// from the next question on. A file that cannot be believed or understood is logged and does not count.
 /// Any thread.
 class TrustedKeys {
 public:
     using Snapshot = std::shared_ptr<const std::vector<TrustedKey>>;
 
-    /// `root` and `log` outlive this.
-    TrustedKeys(const RootDirectory& root, Log& log) : root_(root), log_(log) {}
+    /// `root` and `log` outlive this, and so does the directory's logical path.
+    TrustedKeys(const RootDirectory& root, Log& log, const char* directory = trustedKeysDirectory)
+        : root_(root), log_(log), directory_(directory)
+    {}
 
     /// The present keys. The same pointer as before exactly when nothing was re-read.
     Snapshot current();
@@ -39,6 +41,7 @@ private:
 
     const RootDirectory& root_;
     Log& log_;
+    const char* const directory_;
     std::mutex mutex_;
     Snapshot keys_;
     Seen seen_;

@@ -1,0 +1,187 @@
+#include "platform/linux/linux_background_activities.h"
+#include "platform/linux/linux_log.h"
+#include "platform/linux/scratch_directory.h"
+
+#include <chrono>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+namespace typhon {
+namespace {
+
+using namespace std::chrono_literals;
+
+/// Remembers what a timer was armed for; fires when the test says so. Work on the queue runs at once.
+class ManualQueues final : public WorkQueues {
+public:
+    class Queue final : public WorkQueue {
+    public:
+        const std::string& label() const override { return label_; }
+        void sync(const std::function<void()>& work) override { work(); }
+
+    protected:
+        void start(Task<void> body, WorkItem*, std::shared_ptr<void>) override
+        {
+            kept_.push_back(run(std::move(body)));
+            kept_.back().handle().resume();
+        }
+        bool isSerial() const override { return true; }
+
+    private:
+        static RootTask run(Task<void> body) { co_await std::move(body); }
+        std::string label_ = "activities";
+        std::vector<RootTask> kept_;
+    };
+    class ManualTimer final : public Timer {
+    public:
+        ManualTimer(ManualQueues& owner, std::function<void()> handler) : owner_(owner)
+        {
+            owner_.fire = std::move(handler);
+        }
+        void schedule(std::chrono::nanoseconds delay, std::chrono::nanoseconds) override
+        {
+            owner_.armedFor = std::chrono::duration<double>(delay).count();
+        }
+        void cancel() override {}
+
+    private:
+        ManualQueues& owner_;
+    };
+
+    std::shared_ptr<WorkQueue> createSerialQueue(std::string) override { return std::make_shared<Queue>(); }
+    WorkQueue& concurrentQueue(Priority) override { return queue_; }
+    WorkQueue& mainQueue() override { return queue_; }
+    std::shared_ptr<Semaphore> createSemaphore(unsigned) override { return nullptr; }
+    std::unique_ptr<Timer> createTimer(WorkQueue&, std::function<void()> handler) override
+    {
+        return std::make_unique<ManualTimer>(*this, std::move(handler));
+    }
+    Task<void> pause(std::chrono::nanoseconds) override { co_return; }
+    void runMainLoop() override {}
+
+    double armedFor = -1;
+    std::function<void()> fire;
+
+private:
+    Queue queue_;
+};
+
+class ManualClock final : public Clock {
+public:
+    double now() const override { return seconds; }
+    std::chrono::nanoseconds uptime() const override { return 0ns; }
+    double seconds = 1'000'000;
+};
+
+class LinuxBackgroundActivitiesTest : public testing::Test {
+protected:
+    std::unique_ptr<LinuxBackgroundActivities> start()
+    {
+        states.clear();
+        auto activities = std::make_unique<LinuxBackgroundActivities>(
+            LinuxBackgroundActivities::Services{
+                .queues = queues, .clock = clock, .log = log, .random = [this] { return random; }},
+            RootDirectory(scratch.path()));
+        activities->registerActivity(
+            "org.example.check",
+            [this](const BackgroundActivity& activity) { states.push_back(activity.state()); });
+        return activities;
+    }
+    void register_(const std::string& interval, const std::string& allowsBattery)
+    {
+        scratch.writeFile("/etc/typhon/activities.d/org.example.check.plist",
+                          "<plist version=\"1.0\"><dict><key>Interval</key><integer>" + interval +
+                              "</integer><key>AllowBattery</key><" + allowsBattery + "/></dict></plist>");
+    }
+    void discharge(const std::string& status)
+    {
+        scratch.writeFile("/sys/class/power_supply/BAT0/type", "Battery\n");
+        scratch.writeFile("/sys/class/power_supply/BAT0/status", status + "\n");
+    }
+
+    ScratchDirectory scratch;
+    LinuxLog log{LogLevel::error, LinuxLog::Destination::descriptor, -1};
+    ManualQueues queues;
+    ManualClock clock;
+    double random = 0.5;
+    std::vector<std::int64_t> states;
+    const std::vector<std::int64_t> checkedIn{background_activity_states::checkIn};
+    const std::vector<std::int64_t> hasRun{background_activity_states::checkIn,
+                                           background_activity_states::run};
+};
+
+TEST_F(LinuxBackgroundActivitiesTest, ChecksInFirstAndRunsWhenItIsDue)
+{
+    register_("1000", "false");
+    const auto activities = start();
+    EXPECT_EQ(states, checkedIn);
+    EXPECT_NEAR(queues.armedFor, 50, 0.01) << "never ran: within a tenth of the interval";
+    queues.fire();
+    EXPECT_EQ(states, hasRun);
+    EXPECT_NEAR(queues.armedFor, 1050, 0.01);
+}
+
+TEST_F(LinuxBackgroundActivitiesTest, TheLastRunSurvivesARestart)
+{
+    register_("1000", "false");
+    auto activities = start();
+    queues.fire();
+    activities.reset();
+    clock.seconds += 300;
+    activities = start();
+    EXPECT_EQ(states, checkedIn);
+    EXPECT_NEAR(queues.armedFor, 750, 0.01);
+}
+
+TEST_F(LinuxBackgroundActivitiesTest, ALastRunInTheFutureCountsAsNow)
+{
+    register_("1000", "false");
+    auto activities = start();
+    queues.fire();
+    activities.reset();
+    clock.seconds -= 500'000;
+    activities = start();
+    EXPECT_NEAR(queues.armedFor, 1050, 0.01);
+}
+
+TEST_F(LinuxBackgroundActivitiesTest, IsPutOffOnBatteryUnlessItIsAllowedThere)
+{
+    register_("1000", "false");
+    discharge("Discharging");
+    auto activities = start();
+    queues.fire();
+    EXPECT_EQ(states, checkedIn);
+    EXPECT_NEAR(queues.armedFor, 50, 0.01);
+    discharge("Charging");
+    queues.fire();
+    EXPECT_EQ(states, hasRun);
+    discharge("Discharging");
+    register_("1000", "true");
+    activities = start();
+    queues.fire();
+    EXPECT_EQ(states, hasRun);
+}
+
+TEST_F(LinuxBackgroundActivitiesTest, TheBatteryOfADeviceIsNotTheMachines)
+{
+    discharge("Discharging");
+    EXPECT_TRUE(isOnBattery(RootDirectory(scratch.path())));
+    scratch.writeFile("/sys/class/power_supply/BAT0/scope", "Device\n");
+    EXPECT_FALSE(isOnBattery(RootDirectory(scratch.path())));
+}
+
+TEST_F(LinuxBackgroundActivitiesTest, WithoutARegistrationTheIntervalIsADayAndItsBoundsHold)
+{
+    random = 0;
+    auto activities = start();
+    queues.fire();
+    EXPECT_NEAR(queues.armedFor, 86'400, 0.01);
+    register_("0", "false");
+    activities = start();
+    queues.fire();
+    EXPECT_NEAR(queues.armedFor, 60, 0.01);
+}
+
+}  // namespace
+}  // namespace typhon
