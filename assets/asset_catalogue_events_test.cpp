@@ -44,10 +44,10 @@ TEST_F(AssetCatalogueEventsTest, OtherEventsTriggerNothing)
     simulated.notifications.deliver(event_streams::notifyCentre, "no dictionary");
     simulated.notifications.deliver(event_streams::notifyCentre,
                                     PropertyList::Dictionary{{event_streams::eventName, 7}});
-    for (const char* name :
-         {"", "com.vorlan.Cargon.Font7.kg.new-asset-installed", "com.vorlan.Cargon.Font6.kg.cached-metadata-updated",
-          "com.vorlan.Cargon.LetterformAssets.kg.cached-metadata-removed",
-          "com.vorlan.Cargon.Font7.kg.cached-metadata-updated2"}) {
+    for (const char* name : {"", "com.vorlan.Cargon.Font7.kg.new-asset-installed",
+                             "com.vorlan.Cargon.Font6.kg.cached-metadata-updated",
+                             "com.vorlan.Cargon.LetterformAssets.kg.cached-metadata-removed",
+                             "com.vorlan.Cargon.Font7.kg.cached-metadata-updated2"}) {
         simulated.notifications.deliverNotifyCentre(name);
     }
     simulated.drain();
@@ -94,7 +94,8 @@ TEST_F(AssetCatalogueEventsTest, FontAssetsAreCountedAsTheCatalogueListsThem)
 {
     EXPECT_EQ(events->countFontAssets(), 0U);
     simulated.assetService.add(asset_types::fonts, {.assetId = "listed", .state = asset_states::listed});
-    simulated.assetService.add(asset_types::fonts, {.assetId = "installed", .state = asset_states::installed});
+    simulated.assetService.add(asset_types::fonts,
+                               {.assetId = "installed", .state = asset_states::installed});
     simulated.assetService.add(asset_types::fonts, {.assetId = "obsolete", .state = asset_states::obsolete});
     EXPECT_EQ(events->countFontAssets(), 2U);
     const auto& query = simulated.assetService.queries().back();

@@ -51,13 +51,13 @@ void AssetDirectoryMonitoring::startUp()
 
 void AssetDirectoryMonitoring::startWatching()
 {
-    const auto stream = platform_.fileEvents.createStream(
-        {std::string(font_directories::assetStore)}, latency,
-        [weak = weak_from_this()](const std::vector<std::string>& paths) {
-            if (const auto self = weak.lock()) {
-                self->handleChanges(paths);
-            }
-        });
+    const auto stream =
+        platform_.fileEvents.createStream({std::string(font_directories::assetStore)}, latency,
+                                          [weak = weak_from_this()](const std::vector<std::string>& paths) {
+                                              if (const auto self = weak.lock()) {
+                                                  self->handleChanges(paths);
+                                              }
+                                          });
     const std::lock_guard lock(mutex_);
     stream_ = stream;
     stream->setDispatchQueue(monitorQueue_);

@@ -45,7 +45,8 @@ Task<void> AssetSynchronisation::synchronizeFontAssets(std::vector<std::string> 
     const auto names = std::make_shared<const Names>(assetDirectoryNamesOf(paths, platform_.log));
     Task<PropertyList> matching = matchingEntries(names);
     auto entries = co_await std::move(matching);
-    // Intended: entries are counted against assets, so that one asset with several fonts can stand for others.
+    // Intended: entries are counted against assets, so that one asset with several fonts can stand for
+    // others.
     if (names->size() > entries.asDictionary()->size()) {
         Task<void> synchronizing = synchronize();
         co_await std::move(synchronizing);

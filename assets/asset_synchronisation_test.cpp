@@ -19,10 +19,11 @@ protected:
 
     void ask(const AuditToken& token, Strings paths)
     {
-        simulated.runAs(token, synchronisation.synchronizeFontAssets(
-                                   std::move(paths), [this](bool success, std::optional<PropertyList> answer) {
-                                       answers.push_back({success, std::move(answer)});
-                                   }));
+        simulated.runAs(token,
+                        synchronisation.synchronizeFontAssets(
+                            std::move(paths), [this](bool success, std::optional<PropertyList> answer) {
+                                answers.push_back({success, std::move(answer)});
+                            }));
     }
     AuditToken clientWith(PropertyList entitlement)
     {
@@ -112,8 +113,8 @@ TEST_F(AssetSynchronisationTest, AnAssetThatIsNotRegisteredIsSynchronisedFirst)
 
 TEST_F(AssetSynchronisationTest, AnAssetWithSeveralFontsStandsForOneThatIsMissing)
 {
-    register_({{fontAssets + "abc.asset/a.ttf", fontEntry("A")},
-               {fontAssets + "abc.asset/b.ttf", fontEntry("B")}});
+    register_(
+        {{fontAssets + "abc.asset/a.ttf", fontEntry("A")}, {fontAssets + "abc.asset/b.ttf", fontEntry("B")}});
     ask(client(), {inStore("abc.asset"), inStore("missing.asset")});
     EXPECT_EQ(synchronisations(), 0U) << "two entries for two names";
     EXPECT_EQ(paths().size(), 2U);
@@ -137,11 +138,10 @@ TEST_F(AssetSynchronisationTest, WaitsForTheLibraryWithoutHoldingTheMainHandlerQ
     const auto token = client();
     const auto [accepted, other] = simulated.connect(token);
     bool isAnswered = false;
-    queue->asyncForConnection(accepted, synchronisation.synchronizeFontAssets(
-                                            {inStore("abc.asset")},
-                                            [&](bool success, const std::optional<PropertyList>&) {
-                                                isAnswered = success;
-                                            }));
+    queue->asyncForConnection(
+        accepted, synchronisation.synchronizeFontAssets(
+                      {inStore("abc.asset")},
+                      [&](bool success, const std::optional<PropertyList>&) { isAnswered = success; }));
     simulated.drain();
     EXPECT_FALSE(isAnswered);
     bool hasRun = false;

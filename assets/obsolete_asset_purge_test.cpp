@@ -14,7 +14,10 @@ protected:
             asset_types::previousFonts,
             {.assetId = assetId, .state = state, .foundUnder = asset_return_types::listed});
     }
-    void addCurrent(SimulatedAsset asset) { simulated.assetService.add(asset_types::fonts, std::move(asset)); }
+    void addCurrent(SimulatedAsset asset)
+    {
+        simulated.assetService.add(asset_types::fonts, std::move(asset));
+    }
     void purgePrevious()
     {
         purge.removeObsoleteFontAsset();

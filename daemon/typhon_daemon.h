@@ -81,7 +81,8 @@ public:
     Task<void> synchronizeFontAssets(std::vector<std::string> paths, OutcomeReply reply) override;
     Task<void> resetIssuedFontsFor(std::string identifier, EmptyReply reply) override;
 
-    // Answered by each client's handler: these throw, like a message to an object that does not know it. The dispatch table lets none of them through.
+    // Answered by each client's handler: these throw, like a message to an object that does not know it. The
+    // dispatch table lets none of them through.
     Task<void> checkin(OptionalDictionaryReply reply) override;
     Task<void> checkinForFontPicker(OptionalDictionaryReply reply) override;
     Task<void> sendFonts(PropertyList::Array fonts, EmptyReply reply) override;

@@ -113,8 +113,8 @@ std::optional<std::string> FontAssets::planAsset(int store, const std::string& a
         }
         hasPlaced = true;
         plan.wanted[asset].insert(name);
-        plan.placed.push_back({path, {names.familyNames->begin(), names.familyNames->end()},
-                               isDisabled(before, path)});
+        plan.placed.push_back(
+            {path, {names.familyNames->begin(), names.familyNames->end()}, isDisabled(before, path)});
     }
     return hasPlaced ? flushDirectory(root_.real(place)) : std::nullopt;
 }

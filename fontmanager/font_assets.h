@@ -13,9 +13,9 @@
 
 namespace typhon {
 
-/// The fonts of downloaded assets: keeps a directory below /var/mobile/Library/UserFonts/FontAssets/ for every
-/// asset of the store, with its font files, and their entries in the registry. Files are hard links to those
-/// of the store where the file system allows that, else copies. Any thread; blocks on the disk.
+/// The fonts of downloaded assets: keeps a directory below /var/mobile/Library/UserFonts/FontAssets/ for
+/// every asset of the store, with its font files, and their entries in the registry. Files are hard links to
+/// those of the store where the file system allows that, else copies. Any thread; blocks on the disk.
 class FontAssets {
 public:
     /// `log` outlives this.

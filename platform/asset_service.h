@@ -52,8 +52,8 @@ public:
     /// `purge:`. Removes the asset's files from the store. The result is 0 for success.
     virtual void purge(std::function<void(std::int64_t result)> completion) = 0;
     /// `purgeWithError:`. The same; the error says in words why it failed, and is null when it did not.
-    virtual void purgeWithError(
-        std::function<void(std::int64_t result, std::optional<std::string> error)> completion) = 0;
+    virtual void
+    purgeWithError(std::function<void(std::int64_t result, std::optional<std::string> error)> completion) = 0;
 };
 
 /// A question about the assets of one type: set up, then run once. One thread until it runs.

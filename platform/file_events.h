@@ -31,9 +31,8 @@ public:
     virtual ~FileEvents() = default;
     /// A stream of events of individual files below `paths` (logical paths of directories, which need not be
     /// there yet, and may go and come back). Everything within `latency` from the first event is one batch.
-    virtual std::shared_ptr<FileEventStream> createStream(std::vector<std::string> paths,
-                                                          std::chrono::nanoseconds latency,
-                                                          Callback callback) = 0;
+    virtual std::shared_ptr<FileEventStream>
+    createStream(std::vector<std::string> paths, std::chrono::nanoseconds latency, Callback callback) = 0;
 };
 
 }  // namespace typhon

@@ -49,8 +49,8 @@ public:
     virtual void synchronizeFontProviders() = 0;
     /// `synchronizeProfileFonts:`. Brings profile-installed fonts up to date.
     virtual void synchronizeProfileFonts(std::function<void()> completion) = 0;
-    /// `synchronizeFontAssets:`. Brings the font-asset directory and the registry in step with the asset store;
-    /// false when that failed. A file that is no good font is left out, which is no failure.
+    /// `synchronizeFontAssets:`. Brings the font-asset directory and the registry in step with the asset
+    /// store; false when that failed. A file that is no good font is left out, which is no failure.
     virtual void synchronizeFontAssets(std::function<void(bool)> completion) = 0;
 };
 

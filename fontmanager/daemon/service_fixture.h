@@ -100,8 +100,7 @@ private:
 class RunningService {
 public:
     explicit RunningService(const RootDirectory& root, ReadFontNames readNames)
-        : store(root, readNames, log), profileFonts(root, readNames, log),
-          fontAssets(root, readNames, log),
+        : store(root, readNames, log), profileFonts(root, readNames, log), fontAssets(root, readNames, log),
           ipc(pool, queues, log, root, instanceOfPeer, IpcLimits{}, EndpointHandshake::client)
     {
         openError = store.open().error;

@@ -57,9 +57,8 @@ PropertyList encoded(const AssetCatalogue& catalogue)
     for (const auto& [assetId, asset] : catalogue.assets) {
         assets.emplace(assetId, encoded(asset));
     }
-    return PropertyList::Dictionary{{"assetType", catalogue.assetType},
-                                    {"assets", std::move(assets)},
-                                    {"version", catalogue.version}};
+    return PropertyList::Dictionary{
+        {"assetType", catalogue.assetType}, {"assets", std::move(assets)}, {"version", catalogue.version}};
 }
 
 std::optional<ListedAsset> decodeAsset(const PropertyList& value)

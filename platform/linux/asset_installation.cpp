@@ -62,8 +62,8 @@ std::optional<std::string> copyFiles(const std::string& asset, const ListedAsset
             return error;
         }
     }
-    if (auto error = replaceFile(asset + "/Info.plist", writeBinaryPropertyList(listed.attributes),
-                                 filePermissions)) {
+    if (auto error =
+            replaceFile(asset + "/Info.plist", writeBinaryPropertyList(listed.attributes), filePermissions)) {
         return error;
     }
     return flushDirectory(asset + "/AssetData");

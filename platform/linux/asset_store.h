@@ -44,8 +44,8 @@ public:
     /// key that counts, are for another type, or are older than the present one. Null, or why not.
     std::optional<std::string> replaceCatalogue(const std::string& assetType, const Bytes& contents);
 
-    /// Installs the files of a real folder as that asset, in one step. They have to be what the catalogue says,
-    /// no more and no less. Null, or why not.
+    /// Installs the files of a real folder as that asset, in one step. They have to be what the catalogue
+    /// says, no more and no less. Null, or why not.
     std::optional<std::string> install(const std::string& assetType, const std::string& assetId,
                                        const std::string& folder);
 

@@ -18,22 +18,22 @@ public:
     std::string assetId() const override { return asset_.assetId; }
     void purge(std::function<void(std::int64_t)> completion) override
     {
-        purgeWithError([completion = std::move(completion)](std::int64_t result,
-                                                            const std::optional<std::string>&) {
-            if (completion) {
-                completion(result);
-            }
-        });
+        purgeWithError(
+            [completion = std::move(completion)](std::int64_t result, const std::optional<std::string>&) {
+                if (completion) {
+                    completion(result);
+                }
+            });
     }
     void purgeWithError(std::function<void(std::int64_t, std::optional<std::string>)> completion) override
     {
-        pool_.post([&store = store_, type = type_, assetId = asset_.assetId,
-                    completion = std::move(completion)] {
-            auto error = store.purge(type, assetId);
-            if (completion) {
-                completion(error ? 1 : 0, std::move(error));
-            }
-        });
+        pool_.post(
+            [&store = store_, type = type_, assetId = asset_.assetId, completion = std::move(completion)] {
+                auto error = store.purge(type, assetId);
+                if (completion) {
+                    completion(error ? 1 : 0, std::move(error));
+                }
+            });
     }
 
 private:

@@ -136,10 +136,10 @@ private:
         const auto path = root_.real(lastRunPath_);
         auto error = makeDirectories(directoryOf(path), 0700);
         if (!error) {
-            error = replaceFile(path,
-                                writeBinaryPropertyList(PropertyList::Dictionary{
-                                    {"LastRun", Date{services_.clock.now()}}}),
-                                0600);
+            error = replaceFile(
+                path,
+                writeBinaryPropertyList(PropertyList::Dictionary{{"LastRun", Date{services_.clock.now()}}}),
+                0600);
         }
         if (error) {
             TYLog_Error(services_.log, "the run of " + name_ + " is not remembered: " + *error);
@@ -168,8 +168,7 @@ LinuxBackgroundActivities::~LinuxBackgroundActivities() = default;
 
 void LinuxBackgroundActivities::registerActivity(const std::string& name, Handler handler)
 {
-    const auto activity =
-        std::make_shared<Registered>(services_, root_, name, std::move(handler), *queue_);
+    const auto activity = std::make_shared<Registered>(services_, root_, name, std::move(handler), *queue_);
     {
         const std::lock_guard lock(mutex_);
         activities_.push_back(activity);

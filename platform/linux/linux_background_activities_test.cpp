@@ -1,6 +1,7 @@
 #include "platform/linux/linux_background_activities.h"
 #include "platform/linux/linux_log.h"
 #include "platform/linux/scratch_directory.h"
+#include "platform/root_task.h"
 
 #include <chrono>
 #include <vector>
@@ -83,9 +84,9 @@ protected:
             LinuxBackgroundActivities::Services{
                 .queues = queues, .clock = clock, .log = log, .random = [this] { return random; }},
             RootDirectory(scratch.path()));
-        activities->registerActivity(
-            "org.example.check",
-            [this](const BackgroundActivity& activity) { states.push_back(activity.state()); });
+        activities->registerActivity("org.example.check", [this](const BackgroundActivity& activity) {
+            states.push_back(activity.state());
+        });
         return activities;
     }
     void register_(const std::string& interval, const std::string& allowsBattery)

@@ -62,12 +62,13 @@ public:
 private:
     void begin()
     {
-        watch_ = std::make_shared<DirectoryWatch>(services_.pool, services_.queues, queue_, latency_,
-                                                  [weak = weak_from_this()](const DirectoryWatch::Batch& batch) {
-                                                      if (const auto self = weak.lock()) {
-                                                          self->take(batch);
-                                                      }
-                                                  });
+        watch_ =
+            std::make_shared<DirectoryWatch>(services_.pool, services_.queues, queue_, latency_,
+                                             [weak = weak_from_this()](const DirectoryWatch::Batch& batch) {
+                                                 if (const auto self = weak.lock()) {
+                                                     self->take(batch);
+                                                 }
+                                             });
         walk();
     }
 
@@ -91,8 +92,7 @@ private:
     /// Whether the directories that have to be watched are others now.
     bool changesDirectories(const std::string& path) const
     {
-        const FileDescriptor directory(
-            ::open(path.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+        const FileDescriptor directory(::open(path.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
         return directory || watch_->isWatched(path) || !isInTrees(path);
     }
 
@@ -101,9 +101,8 @@ private:
         std::set<std::string> changed;
         std::ranges::copy_if(batch.paths, std::inserter(changed, changed.end()),
                              [&](const auto& path) { return isInTrees(path); });
-        if (batch.mustRescan || std::ranges::any_of(batch.paths, [&](const auto& path) {
-                return changesDirectories(path);
-            })) {
+        if (batch.mustRescan ||
+            std::ranges::any_of(batch.paths, [&](const auto& path) { return changesDirectories(path); })) {
             changed.merge(walk());
         }
         if (batch.mustRescan || changed.size() > mostPaths) {

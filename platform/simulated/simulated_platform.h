@@ -87,10 +87,23 @@ private:
 public:
     SimulatedIpc& ipc = *ownedIpc_;
     SimulatedRemoteAlerts remoteAlerts{ipc};
-    Platform platform{queues,           clock,        ipc,       codeSigning,         sandbox,
-                      preferences,      fileSystem,   log,       applicationRegistry, userFontManager,
-                      processLifecycle, remoteAlerts, analytics, notifications,       assetService,
-                      fileEvents,       backgroundActivities};
+    Platform platform{queues,
+                      clock,
+                      ipc,
+                      codeSigning,
+                      sandbox,
+                      preferences,
+                      fileSystem,
+                      log,
+                      applicationRegistry,
+                      userFontManager,
+                      processLifecycle,
+                      remoteAlerts,
+                      analytics,
+                      notifications,
+                      assetService,
+                      fileEvents,
+                      backgroundActivities};
 
 private:
     void runOn(std::shared_ptr<void> connection, Task<void> work);

@@ -195,6 +195,11 @@ class ScratchSystem:
         path = self.real(logical)
         path.parent.mkdir(parents=True, exist_ok=True)
         path.write_bytes(content if content is not None else f"font {name} of {directory}".encode())
+        if tree == FONT_ASSETS:
+            # What is in no asset of the store would be unregistered when the daemon starts.
+            stored = self.real(f"{ASSET_STORE}/{directory}/AssetData/{name}")
+            stored.parent.mkdir(parents=True, exist_ok=True)
+            os.link(path, stored)
         return logical
 
     def write_preferences(self, preferences):

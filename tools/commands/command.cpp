@@ -60,11 +60,16 @@ int failToParse(const CLI::App& parser, const CLI::ParseError& error)
 
 void addCommands(CLI::App& parser, Invocation& invocation)
 {
-    for (const auto add :
-         {addKeygenCommand, addTrustCommand, addSignCommand, addRunCommand, addCheckinCommand, addOpenCommand,
-          addMonitorCommand, addLedgerCommand, addDeletionsCommand, addScheduleDeletionCommand,
-          addKeepProviderCommand, addPreferencesCommand, addPlistCommand, addFontsCommand, addRequestCommand,
-          addAgentCommand, addAnalyticsCommand, addApplicationsCommand, addPostNotificationCommand}) {
+    for (const auto add : {addKeygenCommand,       addTrustCommand,
+                           addSignCommand,         addRunCommand,
+                           addCheckinCommand,      addOpenCommand,
+                           addMonitorCommand,      addLedgerCommand,
+                           addDeletionsCommand,    addScheduleDeletionCommand,
+                           addKeepProviderCommand, addPreferencesCommand,
+                           addPlistCommand,        addFontsCommand,
+                           addRequestCommand,      addAgentCommand,
+                           addAssetsCommand,       addAnalyticsCommand,
+                           addApplicationsCommand, addPostNotificationCommand}) {
         add(parser, invocation);
     }
 }

@@ -70,6 +70,7 @@ void addPlistCommand(CLI::App& parser, Invocation& invocation);
 void addFontsCommand(CLI::App& parser, Invocation& invocation);
 void addRequestCommand(CLI::App& parser, Invocation& invocation);
 void addAgentCommand(CLI::App& parser, Invocation& invocation);
+void addAssetsCommand(CLI::App& parser, Invocation& invocation);
 void addAnalyticsCommand(CLI::App& parser, Invocation& invocation);
 void addApplicationsCommand(CLI::App& parser, Invocation& invocation);
 void addPostNotificationCommand(CLI::App& parser, Invocation& invocation);
