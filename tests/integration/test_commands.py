@@ -13,7 +13,7 @@ import unittest
 from scratch_system import BIN, FONT_FILES, ScratchSystem, entry
 
 COMMANDS = ("keygen", "trust", "sign", "run", "checkin", "open", "monitor", "ledger", "deletions", "schedule-deletion",
-            "keep-provider", "preferences", "plist", "fonts", "request", "agent", "analytics",
+            "keep-provider", "preferences", "plist", "fonts", "request", "agent", "assets", "analytics",
             "applications", "post-notification")
 PATH = f"{FONT_FILES}/org.example.foundry/a.ttf"
 

@@ -2,10 +2,12 @@
 
 import datetime
 import os
+import pathlib
+import shutil
 import signal
 import unittest
 
-from scratch_system import FONT_ASSETS, FONT_FILES, ScratchSystem, eventually, in_seconds
+from scratch_system import ASSET_STORE, FONT_ASSETS, FONT_FILES, ScratchSystem, eventually, in_seconds
 
 FAILED = "scheduled deletion failed: "
 ALL_DONE = "all files deleted."
@@ -71,9 +73,11 @@ class Deletion(DeletionTest):
                        and abs((self.scheduled()[path] - before).total_seconds() - delay) < 120)
 
     def test_a_file_of_an_asset_that_the_store_holds_is_kept(self):
-        kept = self.system.font_file("abc.asset", "a.ttf", tree=FONT_ASSETS)
+        # Without a sound font the asset would be left out when the daemon synchronises.
+        font = pathlib.Path("/usr/share/fonts/truetype/dejavu/DejaVuSans.ttf").read_bytes()
+        kept = self.system.font_file("abc.asset", "a.ttf", font, tree=FONT_ASSETS)
         gone = self.system.font_file("xyz.asset", "a.ttf", tree=FONT_ASSETS)
-        self.system.real("/private/var/Cargon/AssetsV2/com_vorlan_Cargon_Font7/abc.asset").mkdir()
+        shutil.rmtree(self.system.real(f"{ASSET_STORE}/xyz.asset"))
         self.system.write_preferences({"delete": {kept: in_seconds(0), gone: in_seconds(0)}})
         self.system.start()
         self.system.daemon.wait_for_line(ALL_DONE)

@@ -1,6 +1,6 @@
 #include "simulation/watched_services.h"
 
-#include "registry/font_directories.h"
+#include "platform/font_directories.h"
 #include "registry/user_font_registry.h"
 
 namespace typhon::simulation {

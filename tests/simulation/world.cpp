@@ -33,7 +33,10 @@ DaemonServices::DaemonServices(SimulatedPlatform& simulated, Defect defect,
                                            simulated.processLifecycle,
                                            simulated.remoteAlerts,
                                            simulated.analytics,
-                                           simulated.notifications}
+                                           simulated.notifications,
+                                           simulated.assetService,
+                                           simulated.fileEvents,
+                                           simulated.backgroundActivities}
 {}
 
 World::World(std::uint64_t seed, Defect defect) : simulated(seed)
