@@ -25,8 +25,9 @@ constexpr PropertyListLimits statementLimits{.bytes = catalogueFileLimit, .depth
 
 Bytes signedBytes(std::span<const std::uint8_t> statement)
 {
-    Bytes bytes(domain.begin(), domain.end());
-    bytes.insert(bytes.end(), statement.begin(), statement.end());
+    Bytes bytes(domain.size() + statement.size());
+    const auto behindDomain = std::ranges::copy(domain, bytes.begin()).out;
+    std::ranges::copy(statement, behindDomain);
     return bytes;
 }
 
