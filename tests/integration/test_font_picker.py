@@ -13,7 +13,7 @@ import unittest
 from gi.repository import GLib
 
 import foreign_client
-from scratch_system import BIN, FONT_FILES, PATIENCE, ScratchSystem
+from scratch_system import BIN, FONT_FILES, PATIENCE, ScratchSystem, eventually
 
 SANS = pathlib.Path("/usr/share/fonts/truetype/dejavu/DejaVuSans.ttf")
 SANS_PATH = f"{FONT_FILES}/org.example.foundry/DejaVuSans.ttf"
@@ -67,8 +67,8 @@ class FontPicker(unittest.TestCase):
         text, _ = application.communicate(timeout=PATIENCE)
         self.assertIn(SANS_PATH, text)
         self.assertIn("was handed 1 font files and read 1", text)
-        ledger = json.loads(self.system.ctl("--json", "ledger").stdout)
-        self.assertIn("org.example.writer", ledger)
+        # Recorded once the application has acknowledged, which is when it may already have ended.
+        eventually(lambda: "org.example.writer" in json.loads(self.system.ctl("--json", "ledger").stdout))
 
     def test_only_the_picker_may_hand_fonts_over(self):
         with self.assertRaises(GLib.Error) as caught:

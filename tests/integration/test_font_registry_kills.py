@@ -25,6 +25,9 @@ class Kills(unittest.TestCase):
     def setUp(self):
         self.system = ScratchSystem()
         self.addCleanup(self.system.close)
+        for writer in range(2):
+            # Else a restarted daemon would take them for removed applications, and change what is being checked.
+            self.system.install_application(f"org.example.writer{writer}")
         self.system.start()
         self.random = random.Random(20)
 

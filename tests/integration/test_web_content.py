@@ -67,8 +67,9 @@ class WebContent(unittest.TestCase):
         return content
 
     def own_sandbox(self):
+        # This folder may itself lie under /tmp.
         return [shutil.which("bwrap"), "--unshare-all", "--die-with-parent", "--ro-bind", "/", "/", "--proc", "/proc",
-                "--dev", "/dev", "--tmpfs", "/tmp", "--bind", self.system.root, self.system.root, "--"]
+                "--dev", "/dev", "--tmpfs", "/tmp", "--bind", self.system.root, self.system.root, "--ro-bind", HERE, HERE, "--"]
 
     def check_in(self, host, endpoint):
         host.call(SUPPORT, "checkinForSilkpageProcess_reply", GLib.Variant("(h)", (0,)), [endpoint])
