@@ -35,8 +35,8 @@ using Checkin = std::shared_ptr<const WebContentCheckin>;
 /// Logs the error and ends the connection, which nobody would use any more.
 ErrorHandler endingErrorHandler(Log& log, const std::weak_ptr<Connection>& weak)
 {
-    return [weak, onError = sluiceErrorHandler(log, routine)](const IpcError& error) {
-        onError(error);
+    return [weak, &log](const IpcError& error) {
+        sluiceErrorHandler(log, routine)(error);
         if (const auto connection = weak.lock()) {
             connection->invalidate();
         }

@@ -115,6 +115,7 @@ private:
     void report(const std::set<std::string>& changed) const
     {
         std::vector<std::string> logical;
+        logical.reserve(changed.size());
         for (const auto& path : changed) {
             logical.push_back(path.substr(services_.root.directory().size()));
         }
