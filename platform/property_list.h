@@ -18,7 +18,7 @@ namespace typhon {
 /// A point in time: seconds since the Unix epoch.
 struct Date {
     double seconds = 0;
-    auto operator<=>(const Date&) const = default;
+    auto operator<=>(const Date&) const = default;  // NOLINT(modernize-use-nullptr): misread
 };
 
 /// Bytes, as opposed to text.

@@ -31,7 +31,7 @@ std::string hexOf(std::span<const std::uint8_t> bytes);
 /// An Ed25519 public key.
 struct PublicKey {
     std::array<std::uint8_t, 32> bytes{};
-    auto operator<=>(const PublicKey&) const = default;
+    auto operator<=>(const PublicKey&) const = default;  // NOLINT(modernize-use-nullptr): misread
 };
 
 /// An Ed25519 secret key with its public one. Wiped when destroyed.
