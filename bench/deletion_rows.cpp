@@ -127,7 +127,10 @@ private:
                 other.processLifecycle,
                 other.remoteAlerts,
                 other.analytics,
-                other.notifications};
+                other.notifications,
+                other.assetService,
+                other.fileEvents,
+                other.backgroundActivities};
     }
 
     ScratchDirectory folder_;
