@@ -38,7 +38,36 @@ private:
     const std::shared_ptr<ExportedObject> object_;
 };
 
+/// Gets every fifth signal wrong: seldom enough that requests wait for each other first.
+class MiscountingSemaphore final : public Semaphore {
+public:
+    MiscountingSemaphore(std::shared_ptr<Semaphore> real, Defect defect)
+        : real_(std::move(real)), defect_(defect)
+    {}
+    Task<void> wait() override { return real_->wait(); }
+    void signal() override
+    {
+        const bool isWrong = ++signals_ % 5 == 0;
+        if (!isWrong || defect_ != Defect::losesTheGate) {
+            real_->signal();
+        }
+        if (isWrong && defect_ == Defect::opensTheGateTwice) {
+            real_->signal();
+        }
+    }
+
+private:
+    const std::shared_ptr<Semaphore> real_;
+    const Defect defect_;
+    int signals_ = 0;
+};
+
 }  // namespace
+
+std::shared_ptr<Semaphore> MeddlingQueues::createSemaphore(unsigned initialCount)
+{
+    return std::make_shared<MiscountingSemaphore>(real_.createSemaphore(initialCount), defect_);
+}
 
 std::optional<CodeSigningTask> ConfusableCodeSigning::taskFromAuditToken(const AuditToken& token)
 {

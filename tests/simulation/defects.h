@@ -4,6 +4,7 @@
 #include "platform/file_system.h"
 #include "platform/ipc.h"
 #include "platform/preferences.h"
+#include "platform/work_queues.h"
 
 #include <cstddef>
 #include <memory>
@@ -27,6 +28,10 @@ enum class Defect {
     pretendsToFlush,
     /// Holds on to what it made for clients that are gone.
     keepsHandlers,
+    /// Forgets now and then to open the gate after a font request.
+    losesTheGate,
+    /// Opens the gate twice now and then.
+    opensTheGateTwice,
 };
 
 /// Code signatures, of the wrong process for a confused daemon.
@@ -76,6 +81,29 @@ public:
 private:
     Preferences& real_;
     const bool pretends_;
+};
+
+/// Queues whose semaphores count wrongly where the defect wants it.
+class MeddlingQueues final : public WorkQueues {
+public:
+    MeddlingQueues(WorkQueues& real, Defect defect) : real_(real), defect_(defect) {}
+    std::shared_ptr<WorkQueue> createSerialQueue(std::string label) override
+    {
+        return real_.createSerialQueue(std::move(label));
+    }
+    WorkQueue& concurrentQueue(Priority priority) override { return real_.concurrentQueue(priority); }
+    WorkQueue& mainQueue() override { return real_.mainQueue(); }
+    std::shared_ptr<Semaphore> createSemaphore(unsigned initialCount) override;
+    std::unique_ptr<Timer> createTimer(WorkQueue& queue, std::function<void()> handler) override
+    {
+        return real_.createTimer(queue, std::move(handler));
+    }
+    Task<void> pause(std::chrono::nanoseconds duration) override { return real_.pause(duration); }
+    void runMainLoop() override { real_.runMainLoop(); }
+
+private:
+    WorkQueues& real_;
+    const Defect defect_;
 };
 
 /// The daemon's transport, which knows what the daemon holds for each client of its named service, and comes

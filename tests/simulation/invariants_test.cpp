@@ -1,5 +1,6 @@
 #include "simulation/daemon_simulation.h"
 #include "simulation/invariants.h"
+#include "simulation/request_simulation.h"
 
 #include <algorithm>
 #include <string>
@@ -15,15 +16,21 @@ namespace {
 
 constexpr std::uint64_t seedsForACanary = 60;
 
-/// In how many of the runs that invariant is reported broken.
-std::size_t runsThatBreak(const Invariant& invariant, Defect defect)
+using Simulation = Findings (*)(std::uint64_t seed, Defect defect);
+
+/// In how many of the runs that invariant is reported broken, in words that contain `saying`.
+std::size_t runsThatBreak(const Invariant& invariant, Defect defect, Simulation simulate = simulateDaemon,
+                          const std::string& saying = {})
 {
     std::size_t count = 0;
     for (std::uint64_t seed = 1; seed <= seedsForACanary; ++seed) {
-        const auto findings = simulateDaemon(seed, defect);
+        const auto findings = simulate(seed, defect);
         const auto name = std::string(invariant.name) + ": ";
         count += std::ranges::any_of(findings.violations,
-                                     [&](const auto& violation) { return violation.starts_with(name); })
+                                     [&](const auto& violation) {
+                                         return violation.starts_with(name) &&
+                                                violation.find(saying) != std::string::npos;
+                                     })
                      ? 1
                      : 0;
     }
@@ -54,6 +61,28 @@ TEST(Invariants, ADaemonThatPretendsToFlushHasLostItsLedgerAfterARestart)
 TEST(Invariants, ADaemonThatHoldsOnToWhatItMadeForItsClientsLeaksIt)
 {
     EXPECT_GT(runsThatBreak(invariants::nothingLeaks, Defect::keepsHandlers), 0U);
+}
+
+TEST(Invariants, ADaemonThatAnswersRequestsTwiceIsCaught)
+{
+    EXPECT_GT(runsThatBreak(invariants::oneAnswer, Defect::answersTwice, simulateRequests), 0U);
+}
+
+TEST(Invariants, ADaemonThatForgetsToOpenTheGateHasLostIt)
+{
+    EXPECT_GT(runsThatBreak(invariants::oneAtATime, Defect::losesTheGate, simulateRequests,
+                            "requests never get their turn"),
+              0U);
+}
+
+TEST(Invariants, ADaemonThatOpensTheGateTwiceIsSeenToLetTwoRequestsThrough)
+{
+    for (const auto* seen :
+         {"two requests at once", "a dialog while another one is up", "lets 2 through instead of one"}) {
+        EXPECT_GT(runsThatBreak(invariants::oneAtATime, Defect::opensTheGateTwice, simulateRequests, seen),
+                  0U)
+            << seen;
+    }
 }
 
 }  // namespace

@@ -53,7 +53,7 @@ private:
 
 class Run {
 public:
-    explicit Run(std::uint64_t seed) : world_(seed) {}
+    Run(std::uint64_t seed, Defect defect) : world_(seed, defect) {}
 
     Findings findings()
     {
@@ -178,9 +178,9 @@ private:
 
 }  // namespace
 
-Findings simulateRequests(std::uint64_t seed)
+Findings simulateRequests(std::uint64_t seed, Defect defect)
 {
-    return Run(seed).findings();
+    return Run(seed, defect).findings();
 }
 
 }  // namespace typhon::simulation

@@ -15,12 +15,13 @@ constexpr std::array identifiers{"com.example.reader",   "com.example.suite", "c
 
 DaemonServices::DaemonServices(SimulatedPlatform& simulated, Defect defect,
                                WatchedPreferences::Report reportUnregistered)
-    : codeSigning(simulated.codeSigning, defect == Defect::confusesProcesses),
+    : queues(simulated.queues, defect),
+      codeSigning(simulated.codeSigning, defect == Defect::confusesProcesses),
       watchedFileSystem(simulated.fileSystem),
       fileSystem(watchedFileSystem, defect == Defect::trustsAnOldRegistry),
       realPreferences(simulated.preferences, defect == Defect::pretendsToFlush),
       preferences(realPreferences, watchedFileSystem, std::move(reportUnregistered)),
-      ipc(simulated.ipc, defect), platform{simulated.queues,
+      ipc(simulated.ipc, defect), platform{queues,
                                            simulated.clock,
                                            ipc,
                                            codeSigning,

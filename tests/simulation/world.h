@@ -23,6 +23,7 @@ struct DaemonServices {
     DaemonServices(SimulatedPlatform& simulated, Defect defect,
                    WatchedPreferences::Report reportUnregistered);
 
+    MeddlingQueues queues;
     ConfusableCodeSigning codeSigning;
     WatchedFileSystem watchedFileSystem;
     AgeingFileSystem fileSystem;
