@@ -5,6 +5,7 @@
 #include "platform/linux/bus_message.h"
 #include "platform/linux/bus_message_codec.h"
 #include "platform/linux/memory_file.h"
+#include "platform/linux/message_bytes.h"
 #include "platform/linux/message_decoder.h"
 #include "platform/linux/message_reception.h"
 #include "platform/linux/opened_bus.h"
@@ -12,6 +13,7 @@
 #include "require.h"
 
 #include <algorithm>
+#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
@@ -19,6 +21,8 @@
 #include <string_view>
 #include <vector>
 
+#include <linux/sockios.h>
+#include <sys/ioctl.h>
 #include <sys/socket.h>
 
 namespace typhon {
@@ -113,16 +117,29 @@ private:
         static_cast<Peer*>(peer)->last_.reset(sd_bus_message_ref(message));
         return 0;
     }
+    std::size_t waiting() const
+    {
+        int bytes = 0;
+        require(::ioctl(bus_.socket(), SIOCINQ, &bytes) == 0, "the socket tells what it holds");
+        return static_cast<std::size_t>(bytes);
+    }
+    /// Of the plain message that waits.
+    std::size_t nextSize() const
+    {
+        std::array<std::uint8_t, messageHeaderSize> header{};
+        require(::recv(bus_.socket(), header.data(), header.size(), MSG_PEEK) == messageHeaderSize,
+                "a message waits");
+        return header.size() + (numberIn(header, 12) + 7) / 8 * 8 + numberIn(header, 4);
+    }
     bool readReady()
     {
+        const auto expected = waiting() - nextSize();
         sd_bus_message* raw = nullptr;
-        const int got = bus_.readMessage(reception_.readySize(), &raw);
+        const int got = bus_.readMessage(&raw);
         const BusMessage message(raw);
-        result.refused = got < 0;
-        if (got > 0) {
-            require(last_ != nullptr, "a message was seen");
-            result.messages.push_back(describe(last_.get()));
-        }
+        require(got > 0 && last_ != nullptr, "sd-bus understands what is plain");
+        require(waiting() == expected, "and reads nothing behind it");
+        result.messages.push_back(describe(last_.get()));
         last_.reset();
         return true;
     }

@@ -226,7 +226,7 @@ bool BusLink::processInput(Afterwards& afterwards)
 void BusLink::processReadyMessage(Afterwards& afterwards)
 {
     sd_bus_message* raw = nullptr;
-    const int result = bus_.readMessage(reception_.readySize(), &raw);
+    const int result = bus_.readMessage(&raw);
     const BusMessage message(raw);
     if (result == -EBADMSG) {
         punishLocked(noMessage, afterwards);

@@ -223,6 +223,42 @@ TEST(LinuxIpcLimits, DescriptorsOfInvalidMessagesAreClosed)
     EXPECT_EQ(service.log.countContaining("something that is no message"), 1U);
 }
 
+TEST(LinuxIpcLimits, NothingBehindAnInvalidMessageIsHandled)
+{
+    TestedService service;
+    const std::string text = "text";
+    const std::string behind = "behind";
+    const auto invalid = WireMessage::call(1, "no interface", "note", &text);
+    const auto before = openDescriptors();
+    for (int times = 0; times < 20; ++times) {
+        const auto socket = rawConnection(service.path());
+        write(socket, pipelinedHandshake() + WireMessage::call(1, testedInterface, "note", &text) + invalid +
+                          WireMessage::call(2, testedInterface, "note", &behind) +
+                          WireMessage::call(3, "org.freedesktop.DBus.Peer", "Ping"));
+        // Gone already, as a rule. sd-bus would lose them, were it to read them.
+        sendWithDescriptors(socket.get(), WireMessage::call(4, "no interface", "note", &text, 4), 4);
+        EXPECT_TRUE(isClosedByPeer(socket.get()));
+    }
+    EXPECT_TRUE(service.log.waitFor("noted text", 20));
+    EXPECT_EQ(service.log.countContaining("noted behind"), 0U);
+    while (openDescriptors() > before) {
+        std::this_thread::yield();
+    }
+    EXPECT_EQ(openDescriptors(), before);
+}
+
+TEST(LinuxIpcLimits, OddButValidMessagesAreHandled)
+{
+    TestedService service;
+    const std::string text = "odd";
+    // A field that nobody knows, in place of one for descriptors.
+    auto message = WireMessage::call(1, testedInterface, "note", &text, 1);
+    message[message.find("\x09\x01u")] = 77;
+    const auto socket = rawConnection(service.path());
+    write(socket, pipelinedHandshake() + message + message);
+    EXPECT_TRUE(service.log.waitFor("noted odd", 2));
+}
+
 TEST(LinuxIpcLimits, AFirstMessageMayCarryDescriptorsRightBehindTheHandshake)
 {
     TestedService service;

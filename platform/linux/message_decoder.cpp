@@ -1,5 +1,7 @@
 #include "platform/linux/message_decoder.h"
 
+#include "platform/linux/message_bytes.h"
+
 #include <array>
 #include <cerrno>
 #include <cstring>
@@ -12,7 +14,6 @@ namespace typhon {
 
 namespace {
 
-constexpr std::size_t headerSize = 16;
 constexpr std::uint8_t descriptorCountField = 9;
 /// Codes like this one are to be ignored.
 constexpr std::uint8_t unknownField = 200;
@@ -28,23 +29,14 @@ public:
 
 private:
     bool skipValue(std::uint8_t type);
-    std::uint32_t number(std::size_t at) const;
+    std::uint32_t number(std::size_t at) const { return numberIn(bytes_, at); }
     void align(std::size_t to) { at_ = (at_ + to - 1) / to * to; }
     bool has(std::size_t count) const { return at_ <= end_ && count <= end_ - at_; }
 
     const std::span<const std::uint8_t> bytes_;
-    std::size_t at_ = headerSize;
+    std::size_t at_ = messageHeaderSize;
     std::size_t end_ = 0;
 };
-
-std::uint32_t HeaderFields::number(std::size_t at) const
-{
-    std::uint32_t result = 0;
-    for (std::size_t index = 0; index < 4; ++index) {
-        result |= std::uint32_t{bytes_[at + index]} << (8 * (bytes_[0] == 'l' ? index : 3 - index));
-    }
-    return result;
-}
 
 bool HeaderFields::skipValue(std::uint8_t type)
 {
@@ -68,10 +60,10 @@ bool HeaderFields::skipValue(std::uint8_t type)
 std::optional<std::size_t> HeaderFields::descriptorCount(std::size_t count)
 {
     std::optional<std::size_t> found;
-    if (bytes_.size() < headerSize || number(12) > bytes_.size() - headerSize) {
+    if (bytes_.size() < messageHeaderSize || number(12) > bytes_.size() - messageHeaderSize) {
         return std::nullopt;
     }
-    end_ = headerSize + number(12);
+    end_ = messageHeaderSize + number(12);
     for (align(8); at_ < end_; align(8)) {
         const auto field = at_;
         // A code, and a type of one letter.

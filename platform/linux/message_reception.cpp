@@ -1,5 +1,8 @@
 #include "platform/linux/message_reception.h"
 
+#include "platform/linux/message_bytes.h"
+#include "platform/linux/plain_message.h"
+
 #include <algorithm>
 #include <array>
 #include <cerrno>
@@ -13,7 +16,6 @@ namespace typhon {
 
 namespace {
 
-constexpr std::size_t headerSize = 16;
 /// What is looked at first; most messages are smaller.
 constexpr std::size_t smallLook = 4U << 10;
 /// Messages up to this size are read by sd-bus itself.
@@ -23,27 +25,17 @@ constexpr std::size_t maximumDescriptors = 253;
 
 using Bytes = std::span<const std::uint8_t>;
 
-std::uint32_t number(Bytes header, std::size_t offset)
-{
-    const bool little = header[0] == 'l';
-    std::uint32_t result = 0;
-    for (std::size_t index = 0; index < 4; ++index) {
-        result |= std::uint32_t{header[offset + index]} << (8 * (little ? index : 3 - index));
-    }
-    return result;
-}
-
 bool isWellFormed(Bytes header)
 {
     // Every message has fields; with none sd-bus would look for them behind its end.
-    return (header[0] == 'l' || header[0] == 'B') && header[3] == 1 && number(header, 12) > 0;
+    return (header[0] == 'l' || header[0] == 'B') && header[3] == 1 && numberIn(header, 12) > 0;
 }
 
 /// Fixed header, padded header fields, body.
 std::uint64_t messageSize(Bytes header)
 {
-    const std::uint64_t fields = number(header, 12);
-    return headerSize + (fields + 7) / 8 * 8 + number(header, 4);
+    const std::uint64_t fields = numberIn(header, 12);
+    return messageHeaderSize + (fields + 7) / 8 * 8 + numberIn(header, 4);
 }
 
 /// Where messages are looked at. Nothing of it is used later.
@@ -94,10 +86,10 @@ MessageReception::Outcome MessageReception::look(int socket)
     if (waiting <= 0) {
         return waiting < 0 && isTransient(errno) ? Outcome::nothing : Outcome::closed;
     }
-    if (static_cast<std::size_t>(waiting) < headerSize || descriptors) {
+    if (static_cast<std::size_t>(waiting) < messageHeaderSize || descriptors) {
         return Outcome::begun;
     }
-    const Bytes header = scratch().first(headerSize);
+    const Bytes header = scratch().first(messageHeaderSize);
     const auto size = messageSize(header);
     if (!isWellFormed(header)) {
         return Outcome::malformed;
@@ -110,8 +102,8 @@ MessageReception::Outcome MessageReception::look(int socket)
         waiting = larger.bytes;
         descriptors = larger.descriptors;
     }
-    readySize_ = size;
-    return std::cmp_greater_equal(waiting, size) && !descriptors ? Outcome::ready : Outcome::begun;
+    const bool isWhole = std::cmp_greater_equal(waiting, size) && !descriptors;
+    return isWhole && isPlainMessage(scratch().first(size)) ? Outcome::ready : Outcome::begun;
 }
 
 MessageReception::Outcome MessageReception::assemble(int socket)
@@ -131,7 +123,7 @@ MessageReception::Outcome MessageReception::assemble(int socket)
 /// After more bytes have come.
 MessageReception::Outcome MessageReception::checkSize()
 {
-    if (size_ == 0 && message_.bytes.size() >= headerSize) {
+    if (size_ == 0 && message_.bytes.size() >= messageHeaderSize) {
         if (!isWellFormed(message_.bytes)) {
             return Outcome::malformed;
         }
@@ -147,7 +139,7 @@ MessageReception::Outcome MessageReception::checkSize()
 MessageReception::Outcome MessageReception::readMore(int socket)
 {
     auto& bytes = message_.bytes;
-    const auto missing = (size_ > 0 ? static_cast<std::size_t>(size_) : headerSize) - bytes.size();
+    const auto missing = (size_ > 0 ? static_cast<std::size_t>(size_) : messageHeaderSize) - bytes.size();
     const auto room = scratch().first(std::min(missing, largeLook));
     iovec part{room.data(), room.size()};
     alignas(cmsghdr) std::array<char, CMSG_SPACE(maximumDescriptors * sizeof(int))> control;

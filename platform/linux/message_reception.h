@@ -20,8 +20,9 @@ struct ReceivedMessage {
 
 /// Bounds what is read of incoming messages. sd-bus reads as much as a message claims to have, 128 MiB, and
 /// as many descriptors as come with it, and keeps that for as long as the rest stays away. So it gets to read
-/// only messages that lie in the socket as a whole and come without descriptors. Others, the large ones and
-/// those that come in pieces, are put together here, within limits. The caller locks.
+/// only messages that lie in the socket as a whole, come without descriptors and are plainly valid. Others,
+/// the large ones, the odd ones and those that come in pieces, are put together here, within limits. The
+/// caller locks.
 class MessageReception {
 public:
     struct Limits {
@@ -54,8 +55,6 @@ public:
     /// Looks at the input of `socket`, which does not block, or reads more of the message that has begun.
     Outcome next(int socket);
     ReceivedMessage take();
-    /// Of the message that is `ready`, in bytes.
-    std::size_t readySize() const { return readySize_; }
     void allowDescriptors(bool allowed) { descriptorsAllowed_ = allowed; }
 
 private:
@@ -68,7 +67,6 @@ private:
     const Limits limits_;
     const std::unique_ptr<HeldBytes::Claim> held_;
     bool descriptorsAllowed_ = true;
-    std::size_t readySize_ = 0;
     bool begun_ = false;
     /// Of the message that has begun, once its header is there.
     std::uint64_t size_ = 0;

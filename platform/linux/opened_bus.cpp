@@ -7,8 +7,6 @@
 #include <string_view>
 
 #include <fcntl.h>
-#include <linux/sockios.h>
-#include <sys/ioctl.h>
 #include <sys/socket.h>
 
 namespace typhon {
@@ -28,12 +26,6 @@ bool makePair(FileDescriptor& first, FileDescriptor& second)
     first = FileDescriptor(pair[0]);
     second = FileDescriptor(pair[1]);
     return true;
-}
-
-std::size_t waitingBytes(int socket)
-{
-    int waiting = 0;
-    return ::ioctl(socket, SIOCINQ, &waiting) == 0 ? static_cast<std::size_t>(waiting) : 0;
 }
 
 }  // namespace
@@ -92,12 +84,11 @@ int OpenedBus::sawMessage(sd_bus_message*, void* bus, sd_bus_error*)
     return 0;
 }
 
-int OpenedBus::readMessage(std::size_t size, sd_bus_message** message)
+int OpenedBus::readMessage(sd_bus_message** message)
 {
     std::uint64_t queuedBefore = 0;
     std::uint64_t queuedAfter = 0;
     sd_bus_get_n_queued_write(bus_.get(), &queuedBefore);
-    const auto before = waitingBytes(socket_);
     sawMessage_ = false;
     const int result = sd_bus_process(bus_.get(), message);
     if (result < 0) {
@@ -107,7 +98,7 @@ int OpenedBus::readMessage(std::size_t size, sd_bus_message** message)
     if (!sawMessage_) {
         return queuedAfter < queuedBefore ? 0 : -EBADMSG;
     }
-    return waitingBytes(socket_) + size < before ? -EBADMSG : 1;
+    return 1;
 }
 
 int OpenedBus::writeOnly()

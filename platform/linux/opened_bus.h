@@ -2,7 +2,6 @@
 
 #include "platform/linux/file_descriptor.h"
 
-#include <cstddef>
 #include <memory>
 
 #include <systemd/sd-bus.h>
@@ -26,11 +25,10 @@ public:
     int open(bool withDescriptors);
     /// Replaces the sockets of our own by `socket`, which does not block. A negative errno on failure.
     int moveOnto(FileDescriptor socket);
-    /// Reads the one message of `size` bytes that lies in the socket: a positive number when it was read, and
-    /// `message` is it, unless sd-bus has dealt with it alone; zero when it had to write first. A negative
-    /// errno when the bus is of no more use: what was read was no message, and sd-bus, which passes over such
-    /// bytes in silence and goes on behind them, may have read more than it should.
-    int readMessage(std::size_t size, sd_bus_message** message);
+    /// Reads the plain message that lies in the socket, and nothing behind it: a positive number when it was
+    /// read, and `message` is it, unless sd-bus has dealt with it alone; zero when it had to write first. A
+    /// negative errno when the bus is of no more use.
+    int readMessage(sd_bus_message** message);
     /// Writes as much as the peer takes of what waits, and reads nothing meanwhile. Returns as
     /// `sd_bus_process`.
     int writeOnly();
