@@ -70,7 +70,7 @@ public:
     virtual void setDoNotBlockOnNetworkStatus(bool doNotBlock) = 0;
 
     /// `queryMetaData:`. Returns at once; `completion` is called exactly once, later, on a thread of the
-    /// service's own, with 0 for success. The query lives at least that long.
+    /// service's own, with 0 for success; it may be empty. The query lives at least that long.
     virtual void queryMetaData(std::function<void(std::int64_t result)> completion) = 0;
     /// `queryMetaDataSync`. The same, blocking on the disk; gives the result.
     virtual std::int64_t queryMetaDataSync() = 0;
@@ -96,7 +96,8 @@ public:
     /// `initWithType:` of `KGAssetQuery`.
     virtual std::shared_ptr<KGAssetQuery> queryWithType(const std::string& type) = 0;
     /// `startCatalogDownload:options:then:` of `KGAsset`. Fetches the catalogue of that type anew; returns at
-    /// once. `then` is called exactly once, later, on a thread of the service's own, with 0 for success.
+    /// once. `then` is called exactly once, later, on a thread of the service's own, with 0 for success; it
+    /// may be empty.
     virtual void startCatalogDownload(const std::string& type, KGDownloadOptions options,
                                       std::function<void(std::int64_t result)> then) = 0;
 };

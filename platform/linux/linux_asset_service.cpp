@@ -127,7 +127,11 @@ void LinuxAssetService::startCatalogDownload(const std::string& type, KGDownload
                                              std::function<void(std::int64_t)> then)
 {
     TYLog_Error(log_, "the catalogue of " + type + " is not fetched: this version cannot download");
-    pool_.post([then = std::move(then)] { then(downloadsUnsupported); });
+    pool_.post([then = std::move(then)] {
+        if (then) {
+            then(downloadsUnsupported);
+        }
+    });
 }
 
 }  // namespace typhon

@@ -8,8 +8,8 @@ namespace {
 
 class FoundAsset final : public KGAsset {
 public:
-    FoundAsset(SimulatedAssetService& service, SimulatedAsset asset)
-        : service_(service), asset_(std::move(asset))
+    FoundAsset(SimulatedAssetService& service, std::string type, SimulatedAsset asset)
+        : service_(service), type_(std::move(type)), asset_(std::move(asset))
     {}
 
     PropertyList attributes() const override { return asset_.attributes; }
@@ -17,19 +17,27 @@ public:
     std::string assetId() const override { return asset_.assetId; }
     void purge(std::function<void(std::int64_t)> completion) override
     {
-        service_.notePurge(asset_.assetId);
-        service_.later(
-            [completion = std::move(completion), result = asset_.purgeResult] { completion(result); });
+        purgeWithError([completion = std::move(completion)](std::int64_t result, const auto& /*error*/) {
+            if (completion) {
+                completion(result);
+            }
+        });
     }
     void purgeWithError(std::function<void(std::int64_t, std::optional<std::string>)> completion) override
     {
         service_.notePurge(asset_.assetId);
-        service_.later([completion = std::move(completion), result = asset_.purgeResult,
-                        error = asset_.purgeError] { completion(result, error); });
+        service_.later(
+            [&service = service_, type = type_, asset = asset_, completion = std::move(completion)] {
+                auto [result, error] = service.purge(type, asset);
+                if (completion) {
+                    completion(result, std::move(error));
+                }
+            });
     }
 
 private:
     SimulatedAssetService& service_;
+    const std::string type_;
     const SimulatedAsset asset_;
 };
 
@@ -53,7 +61,10 @@ public:
     void queryMetaData(std::function<void(std::int64_t)> completion) override
     {
         service_.later([self = shared_from_this(), completion = std::move(completion)] {
-            completion(self->queryMetaDataSync());
+            const auto result = self->queryMetaDataSync();
+            if (completion) {
+                completion(result);
+            }
         });
     }
     std::int64_t queryMetaDataSync() override { return service_.answer(asked_, results_); }
@@ -104,7 +115,7 @@ std::int64_t SimulatedAssetService::answer(const Query& query, std::vector<std::
     }
     for (const auto& asset : assets_[query.type]) {
         if (answers(asset, query)) {
-            results.push_back(std::make_shared<FoundAsset>(*this, asset));
+            results.push_back(std::make_shared<FoundAsset>(*this, query.type, asset));
         }
     }
     return 0;
@@ -114,7 +125,30 @@ void SimulatedAssetService::startCatalogDownload(const std::string& type, KGDown
                                                  std::function<void(std::int64_t)> then)
 {
     downloads_.push_back({type, options.discretionary()});
-    later([then = std::move(then), result = downloadResult_] { then(result); });
+    later([then = std::move(then), result = downloadResult_] {
+        if (then) {
+            then(result);
+        }
+    });
+}
+
+SimulatedAssetService::PurgeOutcome SimulatedAssetService::purge(const std::string& type,
+                                                                 const SimulatedAsset& asset)
+{
+    if (asset.purgeResult != 0 || asset.purgeError) {
+        return {asset.purgeResult, asset.purgeError};
+    }
+    auto& assets = assets_[type];
+    const auto found = std::ranges::find(assets, asset.assetId, &SimulatedAsset::assetId);
+    if (found == assets.end() || found->state == asset_states::listed) {
+        return {1, asset.assetId + " is not installed"};
+    }
+    if (found->state == asset_states::installed) {
+        found->state = asset_states::listed;
+    } else {
+        assets.erase(found);
+    }
+    return {};
 }
 
 }  // namespace typhon

@@ -17,7 +17,7 @@ struct SimulatedAsset {
     std::string assetId = {};
     std::int64_t state = asset_states::installed;
     PropertyList::Dictionary attributes = {};
-    /// What a purge ends with.
+    /// What a purge ends with. After a failure the asset stays.
     std::int64_t purgeResult = 0;
     std::optional<std::string> purgeError = std::nullopt;
     /// The return types under which it is found; null: those of its state.
@@ -49,6 +49,12 @@ public:
 
     /// Runs a query: its answer is that of the moment.
     std::int64_t answer(const Query& query, std::vector<std::shared_ptr<KGAsset>>& results);
+    struct PurgeOutcome {
+        std::int64_t result = 0;
+        std::optional<std::string> error = std::nullopt;
+    };
+    /// Purges an asset, as it was found: with what it was set up to end with, if that is a failure.
+    PurgeOutcome purge(const std::string& type, const SimulatedAsset& asset);
     /// Has `job` run later, on nobody's queue.
     void later(std::function<void()> job) { scheduler_.post(this, std::move(job)); }
     void notePurge(const std::string& assetId) { purged_.push_back(assetId); }

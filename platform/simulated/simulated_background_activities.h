@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/background_activity.h"
+#include "platform/simulated/simulated_scheduler.h"
 
 #include <map>
 #include <string>
@@ -8,11 +9,14 @@
 
 namespace typhon {
 
-/// Background activities that come due when a test says so. One thread.
+/// Background activities that check in by themselves, and come due when a test says so. One thread.
 class SimulatedBackgroundActivities final : public BackgroundActivities {
 public:
+    explicit SimulatedBackgroundActivities(SimulatedScheduler& scheduler) : scheduler_(scheduler) {}
+
     void registerActivity(const std::string& name, Handler handler) override
     {
+        scheduler_.post(this, [handler] { handler(Call(background_activity_states::checkIn)); });
         handlers_.insert_or_assign(name, std::move(handler));
     }
 
@@ -29,6 +33,8 @@ private:
     private:
         const std::int64_t state_;
     };
+
+    SimulatedScheduler& scheduler_;
     std::map<std::string, Handler> handlers_;
 };
 

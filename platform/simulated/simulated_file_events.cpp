@@ -6,6 +6,15 @@
 
 namespace typhon {
 
+namespace {
+
+std::string withFinalSlash(const std::string& path)
+{
+    return path.ends_with('/') ? path : path + '/';
+}
+
+}  // namespace
+
 class SimulatedFileEvents::Stream final : public FileEventStream,
                                           public std::enable_shared_from_this<Stream> {
 public:
@@ -20,8 +29,8 @@ public:
 
     void take(const std::string& path)
     {
-        const bool isBelow =
-            std::ranges::any_of(paths_, [&](const std::string& above) { return path.starts_with(above); });
+        const bool isBelow = std::ranges::any_of(
+            paths_, [&](const std::string& above) { return path.starts_with(withFinalSlash(above)); });
         if (!isStarted_ || !isBelow) {
             return;
         }

@@ -79,7 +79,7 @@ public:
     SimulatedNotifications notifications;
     SimulatedAssetService assetService{scheduler};
     SimulatedFileEvents fileEvents{scheduler};
-    SimulatedBackgroundActivities backgroundActivities;
+    SimulatedBackgroundActivities backgroundActivities{scheduler};
 
 private:
     std::unique_ptr<SimulatedIpc> ownedIpc_ = std::make_unique<SimulatedIpc>(queues, log);
