@@ -6,10 +6,13 @@
 #include <chrono>
 #include <condition_variable>
 #include <filesystem>
+#include <fstream>
 #include <mutex>
 #include <set>
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <unistd.h>
 
 namespace typhon {
 namespace {
@@ -58,6 +61,18 @@ protected:
         const std::lock_guard lock(mutex);
         reported.clear();
         batches = 0;
+    }
+    /// Makes more events in a watched directory than the kernel keeps, on as few files as do not count as
+    /// one.
+    void makeTooManyEvents(const std::string& directory)
+    {
+        unsigned kept = 0;
+        std::ifstream("/proc/sys/fs/inotify/max_queued_events") >> kept;
+        ASSERT_GT(kept, 0U);
+        for (unsigned event = 0; event <= kept; ++event) {
+            const auto path = scratch.real(directory + (event % 2 == 0 ? "even" : "odd"));
+            ::close(::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0644));
+        }
     }
     static std::string whole() { return store.substr(0, store.size() - 1); }
 
@@ -138,6 +153,37 @@ TEST_F(LinuxFileEventsTest, ADirectoryThatIsMovedOutIsNotFollowedAndOneThatIsMov
     for (const auto& path : reported) {
         EXPECT_EQ(path.find("unseen"), std::string::npos) << path;
     }
+}
+
+TEST_F(LinuxFileEventsTest, WhenEventsAreLostTheWholeIsReportedAndWatchedAnew)
+{
+    scratch.writeFile(store + "a.asset/AssetData/a.ttf", "font");
+    start();
+    queue->sync([&] {
+        makeTooManyEvents(store + "a.asset/AssetData/");
+        // Nobody is told of these: only who looks again finds them.
+        scratch.writeFile(store + "late.asset/AssetData/late.ttf", "font");
+    });
+    ASSERT_TRUE(waitFor(whole()));
+    forget();
+    scratch.writeFile(store + "late.asset/AssetData/later.ttf", "font");
+    EXPECT_TRUE(waitFor(store + "late.asset/AssetData/later.ttf"));
+}
+
+TEST_F(LinuxFileEventsTest, AnotherDirectoryInPlaceOfOneAboveTheStoreIsFollowed)
+{
+    scratch.writeFile(store + "a.asset/AssetData/a.ttf", "font");
+    scratch.writeFile("/elsewhere" + store + "b.asset/AssetData/b.ttf", "font");
+    start();
+    fs::rename(scratch.real("/private"), scratch.real("/away"));
+    fs::rename(scratch.real("/elsewhere/private"), scratch.real("/private"));
+    ASSERT_TRUE(waitForAnyOf(store + "b.asset/AssetData/b.ttf", whole()));
+    forget();
+    scratch.writeFile("/away" + store.substr(8) + "a.asset/AssetData/unseen.ttf", "font");
+    scratch.writeFile(store + "b.asset/AssetData/seen.ttf", "font");
+    ASSERT_TRUE(waitForAnyOf(store + "b.asset/AssetData/seen.ttf", whole()));
+    const std::lock_guard lock(mutex);
+    EXPECT_FALSE(reported.contains(store + "a.asset/AssetData/unseen.ttf"));
 }
 
 TEST_F(LinuxFileEventsTest, RemovalsAndReplacementsAreReported)

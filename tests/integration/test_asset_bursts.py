@@ -1,0 +1,86 @@
+"""Many fonts that come into the asset store at once: the daemon has each of them registered, and synchronises once in
+a window, however much changes."""
+
+import os
+import plistlib
+import shutil
+import time
+import unittest
+
+from scratch_system import ASSET_STORE, FONT_ASSETS, REGISTRY, ScratchSystem
+
+FONT = "/usr/share/fonts/truetype/dejavu/DejaVuSansMono.ttf"
+WINDOW = 3
+ASSETS = 200
+FONTS_OF_AN_ASSET = 100
+PATIENCE = 400
+
+
+class AssetBursts(unittest.TestCase):
+    def setUp(self):
+        self.system = ScratchSystem()
+        self.addCleanup(self.system.close)
+        self.store = self.system.real(ASSET_STORE)
+        self.font = self.system.folder / "font.ttf"
+        shutil.copy(FONT, self.font)
+
+    def test_a_burst_of_20000_files_in_new_directories_is_synchronised_once_a_window(self):
+        self.system.start()
+        self.await_watch()
+        began = time.monotonic()
+        batches_before = self.batches()
+        expected = set()
+        for asset in range(ASSETS):
+            data = self.store / f"{asset}.asset" / "AssetData"
+            (data / "nested" / "deeper").mkdir(parents=True)
+            os.link(self.font, data / "nested" / "deeper" / "no-font-of-the-asset.ttf")
+            for font in range(FONTS_OF_AN_ASSET):
+                os.link(self.font, data / f"{font}.ttf")
+                expected.add(f"{FONT_ASSETS}/{asset}.asset/{font}.ttf")
+        self.eventually(lambda: self.registered() == expected)
+        self.eventually(lambda: self.batches() == self.synchronisations())
+        self.assertGreater(self.batches(), batches_before)
+        windows = (time.monotonic() - began) / WINDOW
+        self.assertLessEqual(self.batches() - batches_before, windows + 1)
+
+        began = time.monotonic()
+        batches_before = self.batches()
+        for asset in range(0, ASSETS, 2):
+            shutil.rmtree(self.store / f"{asset}.asset")
+            expected -= {f"{FONT_ASSETS}/{asset}.asset/{font}.ttf" for font in range(FONTS_OF_AN_ASSET)}
+        self.eventually(lambda: self.registered() == expected)
+        windows = (time.monotonic() - began) / WINDOW
+        self.assertLessEqual(self.batches() - batches_before, windows + 1)
+        self.assertEqual(self.system.daemon.lines_with("were not synchronised"), [])
+
+    def await_watch(self):
+        """The watch begins some time after the first synchronisation: touches the store until that is noticed."""
+        touched = self.store / "touched"
+
+        def is_noticed():
+            touched.touch()
+            touched.unlink()
+            return self.batches() > 0
+        self.eventually(is_noticed)
+        self.eventually(lambda: self.batches() == self.synchronisations())
+
+    def batches(self):
+        return len(self.system.daemon.lines_with("FontAssetsEventStreamCallback - "))
+
+    def synchronisations(self):
+        """Those that followed a batch."""
+        return len(self.system.daemon.lines_with("synchronizeFontAssets result - success"))
+
+    def registered(self):
+        path = self.system.real(REGISTRY)
+        return set(plistlib.loads(path.read_bytes())) if path.exists() else set()
+
+    def eventually(self, condition):
+        deadline = time.monotonic() + PATIENCE
+        while not condition():
+            self.assertLess(time.monotonic(), deadline, "it never came to pass")
+            time.sleep(0.1)
+
+
+if __name__ == "__main__":
+    unittest.main()
