@@ -52,6 +52,13 @@ void drop(PropertyList::Dictionary& entries, const std::string& path, RegistryCh
     }
 }
 
+void prepend(const RegistryChange& earlier, RegistryChange& change)
+{
+    change.available.insert(change.available.begin(), earlier.available.begin(), earlier.available.end());
+    change.gone.insert(change.gone.begin(), earlier.gone.begin(), earlier.gone.end());
+    change.isRegistryChanged = change.isRegistryChanged || earlier.isRegistryChanged;
+}
+
 std::string notRegistered(const std::string& path)
 {
     return visibleText(path) + " is not registered";
@@ -103,11 +110,11 @@ RegistryChangeOutcome FontStore::commit(FontRegistration& registration)
     if (auto error = registration.finish()) {
         return {.change = {}, .error = std::move(error)};
     }
-    const std::lock_guard lock(mutex_);
-    auto interrupted = completeInterruptedChange();
-    if (interrupted.error) {
-        return interrupted;
-    }
+    return inTurn([&] { return commitFiles(registration); });
+}
+
+RegistryChangeOutcome FontStore::commitFiles(FontRegistration& registration)
+{
     PendingChange pending{.placements = registration.fonts(), .removals = {}};
     for (const auto& staged : pending.placements) {
         const auto name = font_paths::placeOfFontFile(staged.font.path)->name;
@@ -127,109 +134,127 @@ RegistryChangeOutcome FontStore::commit(FontRegistration& registration)
 
 RegistryChangeOutcome FontStore::unregister(const std::vector<std::string>& paths)
 {
-    const std::lock_guard lock(mutex_);
-    auto interrupted = completeInterruptedChange();
-    if (interrupted.error) {
-        return interrupted;
-    }
     for (const auto& path : paths) {
         if (!font_paths::placeOfFontFile(path)) {
             return {.change = {}, .error = visibleText(path) + " is not a provider's font file"};
         }
     }
-    auto missing = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
-        const auto stranger =
-            std::ranges::find_if(paths, [&](const auto& path) { return !entries.contains(path); });
-        return stranger == paths.end() ? std::nullopt : std::optional(notRegistered(*stranger));
+    return inTurn([&]() -> RegistryChangeOutcome {
+        auto missing = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
+            const auto stranger =
+                std::ranges::find_if(paths, [&](const auto& path) { return !entries.contains(path); });
+            return stranger == paths.end() ? std::nullopt : std::optional(notRegistered(*stranger));
+        });
+        return missing ? RegistryChangeOutcome{.change = {}, .error = std::move(missing)}
+                       : apply({.placements = {}, .removals = paths}, false);
     });
-    return missing ? RegistryChangeOutcome{.change = {}, .error = std::move(missing)}
-                   : apply({.placements = {}, .removals = paths}, false);
 }
 
 RegistryChangeOutcome FontStore::unregisterAll(const std::string& identifier)
 {
-    const std::lock_guard lock(mutex_);
-    auto interrupted = completeInterruptedChange();
     const auto directory = directoryNameFromIdentifier(identifier);
-    if (interrupted.error || !directory) {
-        // An identifier that has no directory has no fonts.
-        return interrupted;
-    }
-    PendingChange pending;
-    const auto prefix = font_paths::fontFiles + *directory + "/";
-    auto error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
-        for (auto at = entries.lower_bound(prefix); at != entries.end() && at->first.starts_with(prefix);
-             ++at) {
-            pending.removals.push_back(at->first);
+    return inTurn([&]() -> RegistryChangeOutcome {
+        if (!directory) {
+            // An identifier that has no directory has no fonts.
+            return {};
         }
-        return std::nullopt;
+        PendingChange pending;
+        const auto prefix = font_paths::fontFiles + *directory + "/";
+        auto error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
+            for (auto at = entries.lower_bound(prefix); at != entries.end() && at->first.starts_with(prefix);
+                 ++at) {
+                pending.removals.push_back(at->first);
+            }
+            return std::nullopt;
+        });
+        if (error || pending.removals.empty()) {
+            return {.change = {}, .error = std::move(error)};
+        }
+        return apply(pending, false);
     });
-    if (error || pending.removals.empty()) {
-        return {.change = {}, .error = std::move(error)};
-    }
-    return apply(pending, false);
 }
 
 RegistryChangeOutcome FontStore::setEnabled(const std::vector<std::string>& paths, bool enabled)
 {
-    const std::lock_guard lock(mutex_);
-    auto outcome = completeInterruptedChange();
-    if (outcome.error) {
-        return outcome;
-    }
-    RegistryChange change;
-    outcome.error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
-        for (const auto& path : paths) {
-            const auto found = entries.find(path);
-            const auto* entry = found == entries.end() ? nullptr : found->second.asDictionary();
-            if (entry == nullptr) {
-                return notRegistered(path);
+    return inTurn([&]() -> RegistryChangeOutcome {
+        RegistryChange change;
+        auto error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
+            for (const auto& path : paths) {
+                const auto found = entries.find(path);
+                const auto* entry = found == entries.end() ? nullptr : found->second.asDictionary();
+                if (entry == nullptr) {
+                    return notRegistered(path);
+                }
+                if (isEnabled(found->second) == enabled) {
+                    continue;
+                }
+                auto changed = *entry;
+                changed.insert_or_assign("disabled", !enabled);
+                found->second = std::move(changed);
+                change.isRegistryChanged = true;
+                (enabled ? change.available : change.gone).push_back(path);
             }
-            if (isEnabled(found->second) == enabled) {
-                continue;
-            }
-            auto changed = *entry;
-            changed.insert_or_assign("disabled", !enabled);
-            found->second = std::move(changed);
-            change.isRegistryChanged = true;
-            (enabled ? change.available : change.gone).push_back(path);
-        }
-        return std::nullopt;
+            return std::nullopt;
+        });
+        return {.change = error ? RegistryChange{} : std::move(change), .error = std::move(error)};
     });
-    return outcome.error ? outcome
-                         : RegistryChangeOutcome{.change = std::move(change), .error = std::nullopt};
 }
 
 RegistryChangeOutcome FontStore::synchronizeProviders()
 {
-    const std::lock_guard lock(mutex_);
-    auto outcome = completeInterruptedChange();
-    if (outcome.error) {
-        return outcome;
-    }
-    RegistryChange change;
-    outcome.error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
-        std::vector<std::string> lost;
-        for (const auto& [path, entry] : entries) {
-            if (font_paths::placeOfFontFile(path) && !isFileThere(path)) {
-                lost.push_back(path);
+    return inTurn([&]() -> RegistryChangeOutcome {
+        RegistryChange change;
+        auto error = registry_.update([&](PropertyList::Dictionary& entries) -> std::optional<std::string> {
+            std::vector<std::string> lost;
+            for (const auto& [path, entry] : entries) {
+                if (font_paths::placeOfFontFile(path) && !isFileThere(path)) {
+                    lost.push_back(path);
+                }
             }
+            for (const auto& path : lost) {
+                drop(entries, path, change);
+            }
+            return std::nullopt;
+        });
+        for (const auto& name : directories_.names()) {
+            // Goes, if it is empty, when it is left.
+            directories_.open(name, false);
         }
-        for (const auto& path : lost) {
-            drop(entries, path, change);
-        }
-        return std::nullopt;
+        return {.change = error ? RegistryChange{} : std::move(change), .error = std::move(error)};
     });
-    for (const auto& name : directories_.names()) {
-        // Goes, if it is empty, when it is left.
-        directories_.open(name, false);
+}
+
+void FontStore::changeWasReported()
+{
+    const std::lock_guard lock(mutex_);
+    if (const auto error = eraseCompletedChange()) {
+        TYLog_Error(log_, *error);
     }
-    return outcome.error ? outcome
-                         : RegistryChangeOutcome{.change = std::move(change), .error = std::nullopt};
+}
+
+/// Runs an operation under the lock, once no other change is left in its middle. What that brought about is
+/// told with the outcome: whoever left it could not report it.
+RegistryChangeOutcome FontStore::inTurn(const std::function<RegistryChangeOutcome()>& operation)
+{
+    const std::lock_guard lock(mutex_);
+    auto earlier = completeInterruptedChange();
+    if (!earlier.error) {
+        // Completing it once more after another change would undo that one.
+        earlier.error = eraseCompletedChange();
+    }
+    if (earlier.error) {
+        return earlier;
+    }
+    auto outcome = operation();
+    prepend(earlier.change, outcome.change);
+    return outcome;
 }
 
 RegistryChangeOutcome FontStore::completeInterruptedChange()
 {
+    if (isJournalComplete_) {
+        return {};
+    }
     auto reading = journal_.read();
     if (!reading.change) {
         return {.change = {}, .error = std::move(reading.error)};
@@ -237,6 +262,13 @@ RegistryChangeOutcome FontStore::completeInterruptedChange()
     TYLog(log_, "completing a change of fonts that was interrupted");
     dropLostPlacements(*reading.change);
     return apply(std::move(*reading.change), true);
+}
+
+std::optional<std::string> FontStore::eraseCompletedChange()
+{
+    auto error = isJournalComplete_ ? journal_.erase() : std::nullopt;
+    isJournalComplete_ = isJournalComplete_ && error;
+    return error;
 }
 
 RegistryChangeOutcome FontStore::apply(PendingChange pending, bool isJournalled)
@@ -249,8 +281,12 @@ RegistryChangeOutcome FontStore::apply(PendingChange pending, bool isJournalled)
             }
         }
         for (const auto& path : pending.removals) {
-            drop(entries, path, outcome.change);
+            // The run that was interrupted may have come as far as this, but not to its report.
+            if (entries.erase(path) > 0 || isJournalled) {
+                outcome.change.gone.push_back(path);
+            }
         }
+        outcome.change.isRegistryChanged = true;
         return std::nullopt;
     };
     const auto beforeReplacing = [&] {
@@ -263,10 +299,7 @@ RegistryChangeOutcome FontStore::apply(PendingChange pending, bool isJournalled)
         return outcome;
     }
     removeFiles(pending.removals);
-    if (const auto error = journal_.erase()) {
-        // Completing it once more changes nothing.
-        TYLog_Error(log_, *error);
-    }
+    isJournalComplete_ = true;
     return outcome;
 }
 

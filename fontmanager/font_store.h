@@ -9,6 +9,7 @@
 #include "platform/log.h"
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -44,8 +45,12 @@ public:
     FontStore(RootDirectory root, ReadFontNames readNames, Log& log, RegistrationLimits limits = {});
 
     /// Takes the store for this process, completes a change that was interrupted, and removes copies that
-    /// nobody will use. The change that was completed, if any. Once, before anything else.
+    /// nobody will use. The change that was completed, or may not have been reported, if any. Once, before
+    /// anything else.
     RegistryChangeOutcome open();
+    /// The changes that operations gave have been reported. Without it, what the latest one placed or removed
+    /// is given once more by the next run.
+    void changeWasReported();
 
     struct Beginning {
         std::unique_ptr<FontRegistration> registration;
@@ -53,6 +58,10 @@ public:
     };
     /// Begins a registration for the provider with that identifier. It must not outlive the store.
     Beginning begin(const std::string& identifier, bool enabled);
+
+    // What each of these gives includes a change before it that had failed in its middle and is complete now;
+    // so it may come with an error too.
+
     /// Registers the files of a registration and takes them from it. Files of the same names are replaced.
     RegistryChangeOutcome commit(FontRegistration& registration);
 
@@ -66,7 +75,10 @@ public:
     RegistryChangeOutcome synchronizeProviders();
 
 private:
+    RegistryChangeOutcome inTurn(const std::function<RegistryChangeOutcome()>& operation);
     RegistryChangeOutcome completeInterruptedChange();
+    std::optional<std::string> eraseCompletedChange();
+    RegistryChangeOutcome commitFiles(FontRegistration& registration);
     RegistryChangeOutcome apply(PendingChange change, bool isJournalled);
     std::optional<std::string> place(const PendingChange& change);
     void removeFiles(const std::vector<std::string>& paths);
@@ -84,6 +96,8 @@ private:
     std::mutex mutex_;
     // Below: protected by the mutex.
     ChangeJournal journal_;
+    /// The change in the journal is complete, but may not have been reported.
+    bool isJournalComplete_ = false;
     std::optional<FileLock> lock_;
     std::uint64_t serial_ = 0;
 };

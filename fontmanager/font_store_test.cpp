@@ -91,6 +91,8 @@ TEST_F(FontStoreTest, UnregisteringRemovesEntryFileAndTheEmptyDirectory)
     store.unregister({directory + "/y.ttf"});
     EXPECT_THAT(files(), IsEmpty());
     EXPECT_EQ(registry(), PropertyList());
+    EXPECT_TRUE(isThere(font_paths::journal));
+    store.changeWasReported();
     EXPECT_FALSE(isThere(font_paths::journal));
 }
 

@@ -30,7 +30,9 @@ protected:
     RegistryChangeOutcome nextRun()
     {
         FontStore store(root, readText, log);
-        return store.open();
+        auto outcome = store.open();
+        store.changeWasReported();
+        return outcome;
     }
     PropertyList registry() const
     {
@@ -125,12 +127,63 @@ TEST_F(InterruptedChangeTest, ADecidedRemovalIsCompleted)
     EXPECT_FALSE(std::filesystem::exists(root.real(directory)));
 }
 
-TEST_F(InterruptedChangeTest, OneWhoseRegistryWasReplacedAlreadyRemovesTheFile)
+TEST_F(InterruptedChangeTest, OneWhoseRegistryWasReplacedAlreadyRemovesTheFileAndIsReported)
 {
     ASSERT_EQ(ChangeJournal(root).write({.placements = {}, .removals = {directory + "/old.ttf"}}),
               std::nullopt);
-    EXPECT_THAT(nextRun().change.gone, IsEmpty());
+    EXPECT_THAT(nextRun().change.gone, ElementsAre(directory + "/old.ttf"));
     EXPECT_FALSE(std::filesystem::exists(root.real(directory)));
+}
+
+TEST_F(InterruptedChangeTest, OneThatWasNotReportedIsGivenToTheNextRunToo)
+{
+    registerOld();
+    {
+        FontStore killed(root, readText, log);
+        killed.open();
+        EXPECT_THAT(killed.unregister({directory + "/old.ttf"}).change.gone,
+                    ElementsAre(directory + "/old.ttf"));
+    }
+    EXPECT_THAT(nextRun().change.gone, ElementsAre(directory + "/old.ttf"));
+    EXPECT_FALSE(nextRun().change.isRegistryChanged);
+}
+
+TEST_F(InterruptedChangeTest, OneThatWasReportedIsNot)
+{
+    registerOld();
+    {
+        FontStore store(root, readText, log);
+        store.open();
+        store.unregister({directory + "/old.ttf"});
+        store.changeWasReported();
+    }
+    EXPECT_FALSE(nextRun().change.isRegistryChanged);
+}
+
+TEST_F(InterruptedChangeTest, OneThatWasNotReportedIsNotDoneAgainOverALaterChange)
+{
+    {
+        FontStore store(root, readText, log);
+        store.open();
+        auto begun = store.begin("org.example.a", true);
+        ASSERT_EQ(begun.registration->add("x.ttf", fileWith("font X").get()), std::nullopt);
+        ASSERT_EQ(store.commit(*begun.registration).error, std::nullopt);
+        ASSERT_EQ(store.setEnabled({directory + "/x.ttf"}, false).error, std::nullopt);
+    }
+    EXPECT_FALSE(nextRun().change.isRegistryChanged);
+    EXPECT_TRUE(registry().find(directory + "/x.ttf")->find("disabled")->isTrue());
+}
+
+TEST_F(InterruptedChangeTest, WhatTheNextOperationCompletesItTellsEvenIfItFailsItself)
+{
+    FontStore store(root, readText, log);
+    ASSERT_EQ(store.open().error, std::nullopt);
+    ASSERT_EQ(ChangeJournal(root).write({.placements = {staged(0, "x.ttf")}, .removals = {}}), std::nullopt);
+    const auto outcome = store.setEnabled({directory + "/unknown.ttf"}, true);
+    EXPECT_TRUE(outcome.error);
+    EXPECT_THAT(outcome.change.available, ElementsAre(directory + "/x.ttf"));
+    EXPECT_NE(registry().find(directory + "/x.ttf"), nullptr);
+    EXPECT_THAT(store.unregister({directory + "/x.ttf"}).change.available, IsEmpty());
 }
 
 TEST_F(InterruptedChangeTest, AJournalThatIsNotOursStopsEverythingAndIsLeft)

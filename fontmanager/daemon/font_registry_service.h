@@ -7,6 +7,7 @@
 #include "fontmanager/profile_fonts.h"
 #include "platform/ipc.h"
 #include "platform/log.h"
+#include "platform/work_queue.h"
 
 #include <atomic>
 #include <cstddef>
@@ -27,6 +28,8 @@ public:
         CallerIdentities& identities;
         ChangeReports& reports;
         Log& log;
+        /// On which changes are made and reported, one after another.
+        WorkQueue& changes;
     };
 
     /// All parts outlive this and every connection.

@@ -75,6 +75,23 @@ TEST_F(FontRegistryServiceTest, SwitchingAndRemovingReportWhatChanged)
                 ElementsAre("updating", "-DejaVuSans.ttf", "updating", "-LiberationSerif-Regular.ttf"));
 }
 
+TEST_F(FontRegistryServiceTest, AChangeIsReportedBeforeTheNextBeginsSoThatNoReportOvertakesAnother)
+{
+    const std::set<std::string> turns{running.changes->label()};
+    ASSERT_TRUE(client().registerFonts("org.example.a", {test_fonts::sans}, true));
+    EXPECT_EQ(running.reports.queues(), turns);
+    ASSERT_TRUE(client().enableOrDisable({fileUrlFromPath(own + "DejaVuSans.ttf")}, false));
+    ASSERT_TRUE(client().unregisterAllFonts("org.example.a"));
+    ASSERT_TRUE(client().synchronizeFontProviders());
+    EXPECT_EQ(running.reports.queues(), turns);
+}
+
+TEST_F(FontRegistryServiceTest, WhatWasReportedIsNotReportedByTheNextRun)
+{
+    ASSERT_TRUE(client().registerFonts("org.example.a", {test_fonts::sans}, true));
+    EXPECT_FALSE(std::filesystem::exists(scratch.path() + font_paths::journal));
+}
+
 TEST_F(FontRegistryServiceTest, AProviderIsDeniedEverythingOfOthers)
 {
     ASSERT_TRUE(client().registerFonts("org.example.b", {test_fonts::sans}, true));

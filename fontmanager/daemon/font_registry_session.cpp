@@ -13,7 +13,8 @@
 
 // Who a caller is, is asked anew for every operation that names fonts; the files of a registration come under
 // the permission with which it was begun. Reports go out around the write, so that the daemon neither reads a
-// registry that is just being replaced nor serves one that was.
+// registry that is just being replaced nor serves one that was. A change and its reports are over before the
+// next begins: reports that overtook each other would tell of fonts that are gone again as if they had come.
 
 namespace typhon {
 
@@ -54,13 +55,6 @@ Paths pathsOf(const PropertyList& urls)
         result.paths.push_back(std::move(*path));
     }
     return result;
-}
-
-/// Whose font file that is, or nobody's.
-std::optional<std::string> providerOf(const std::string& path)
-{
-    const auto place = font_paths::placeOfFontFile(path);
-    return place ? identifierFromDirectoryName(place->directory) : std::nullopt;
 }
 
 void answerCount(const Call& call, const RegistryChange& change)
@@ -109,6 +103,13 @@ Task<void> FontRegistrySession::handle(Self self, AuditToken caller, Call call)
         }
     }
     abort();
+}
+
+bool FontRegistrySession::Permission::coversFile(const std::string& path) const
+{
+    const auto place = font_paths::placeOfFontFile(path);
+    const auto provider = place ? identifierFromDirectoryName(place->directory) : std::nullopt;
+    return everybody || (provider && provider == identifier);
 }
 
 Task<FontRegistrySession::Permission> FontRegistrySession::permissionOf(Self self, AuditToken caller)
@@ -179,6 +180,12 @@ Task<void> FontRegistrySession::commitRegistration(Self self, AuditToken /*calle
         call->fail({ipc_errors::failed, "no registration is under way on this connection"});
         co_return;
     }
+    // Whoever passed slow files keeps nobody waiting with them but itself.
+    if (auto error = self->registration_->finish()) {
+        self->registration_.reset();
+        call->fail({ipc_errors::failed, std::move(*error)});
+        co_return;
+    }
     std::vector<std::string> paths;
     for (const auto& staged : self->registration_->fonts()) {
         paths.push_back(staged.font.path);
@@ -187,7 +194,7 @@ Task<void> FontRegistrySession::commitRegistration(Self self, AuditToken /*calle
         auto& registration = *self->registration_;
         return registration.fonts().empty() ? RegistryChangeOutcome{} : store.commit(registration);
     };
-    Task<RegistryChangeOutcome> changing = change(self, std::move(work));
+    Task<RegistryChangeOutcome> changing = changeInTurn(self, std::move(work));
     const auto outcome = co_await std::move(changing);
     // Whoever is answered finds no copies any more.
     self->registration_.reset();
@@ -213,7 +220,7 @@ Task<void> FontRegistrySession::unregister(Self self, AuditToken caller, Call ca
     const auto permission = co_await std::move(asking);
     auto [paths, error] = pathsOf(value(call, 0));
     for (const auto& path : paths) {
-        if (!permission.covers(providerOf(path).value_or("")) && !error) {
+        if (!permission.coversFile(path) && !error) {
             error = denied(visibleText(path, 300) + " is not a font file of the caller's");
         }
     }
@@ -251,7 +258,7 @@ Task<void> FontRegistrySession::enableOrDisable(Self self, AuditToken caller, Ca
     const auto permission = co_await std::move(asking);
     auto [paths, error] = pathsOf(value(call, 0));
     for (const auto& path : paths) {
-        if (!permission.covers(providerOf(path).value_or("")) && !error) {
+        if (!permission.coversFile(path) && !error) {
             error = denied(visibleText(path, 300) + " is not a font file of the caller's");
         }
     }
@@ -277,7 +284,7 @@ Task<void> FontRegistrySession::synchronizeFontProviders(Self self, AuditToken c
     std::function<RegistryChangeOutcome(FontStore&)> work = [](FontStore& store) {
         return store.synchronizeProviders();
     };
-    Task<RegistryChangeOutcome> changing = change(self, std::move(work));
+    Task<RegistryChangeOutcome> changing = changeInTurn(self, std::move(work));
     const auto outcome = co_await std::move(changing);
     if (outcome.error) {
         call->fail({ipc_errors::failed, *outcome.error});
@@ -313,6 +320,7 @@ Task<void> FontRegistrySession::synchronizeFontAssets(Self self, AuditToken call
         call->fail(permission.error.value_or(denied("that is for the daemon and administrators")));
         co_return;
     }
+    // Reads any number of fonts, and nobody else changes those.
     std::function<RegistryChangeOutcome(FontStore&)> work =
         [&fontAssets = self->service_->parts().fontAssets](FontStore&) { return fontAssets.synchronize(); };
     Task<RegistryChangeOutcome> changing = change(self, std::move(work));
@@ -336,13 +344,23 @@ Task<RegistryChangeOutcome> FontRegistrySession::change(Self self,
     }
     Task<void> reporting = parts.reports.report(outcome.change, ChangeReports::Kind::userFonts);
     co_await std::move(reporting);
+    parts.store.changeWasReported();
     co_return outcome;
+}
+
+Task<RegistryChangeOutcome>
+FontRegistrySession::changeInTurn(Self self, std::function<RegistryChangeOutcome(FontStore&)> work)
+{
+    auto& turns = self->service_->parts().changes;
+    Task<RegistryChangeOutcome> changing = change(self, std::move(work));
+    Task<RegistryChangeOutcome> inTurn = turns.perform(std::move(changing));
+    co_return co_await std::move(inTurn);
 }
 
 Task<void> FontRegistrySession::changeAndAnswer(Self self, Call call,
                                                 std::function<RegistryChangeOutcome(FontStore&)> work)
 {
-    Task<RegistryChangeOutcome> changing = change(self, std::move(work));
+    Task<RegistryChangeOutcome> changing = changeInTurn(self, std::move(work));
     const auto outcome = co_await std::move(changing);
     if (outcome.error) {
         call->fail({ipc_errors::failed, *outcome.error});

@@ -35,6 +35,7 @@ private:
         std::optional<IpcError> error;
 
         bool covers(const std::string& provider) const { return everybody || identifier == provider; }
+        bool coversFile(const std::string& path) const;
     };
     static Task<Permission> permissionOf(Self self, AuditToken caller);
 
@@ -52,6 +53,9 @@ private:
     /// Changes the fonts, with the reports before and after it, and tells how it went.
     static Task<RegistryChangeOutcome> change(Self self,
                                               std::function<RegistryChangeOutcome(FontStore&)> work);
+    /// The same when no other change is under way.
+    static Task<RegistryChangeOutcome> changeInTurn(Self self,
+                                                    std::function<RegistryChangeOutcome(FontStore&)> work);
     static Task<void> changeAndAnswer(Self self, Call call,
                                       std::function<RegistryChangeOutcome(FontStore&)> work);
 

@@ -50,6 +50,7 @@ struct Helper {
     LinuxLog log;
     EventPool pool;
     LinuxWorkQueues queues{pool};
+    std::shared_ptr<WorkQueue> changes = queues.createSerialQueue("com.vorlan.typhond.fontChanges");
     LinuxIpc ipc;
     DaemonIdentities identities{ipc};
     DaemonReports reports{ipc, log};
@@ -108,9 +109,14 @@ void waitForTheEnd(HelperLife& life, const FontRegistryService& service, Log& lo
     }
 }
 
+/// Makes up for what an earlier run, which may have been killed, did not report any more.
 Task<void> reportCompleted(Helper& helper, RegistryChange change)
 {
-    return helper.reports.report(std::move(change), ChangeReports::Kind::userFonts);
+    // Whatever it wrote last, the daemon is to read it.
+    change.isRegistryChanged = true;
+    Task<void> reporting = helper.reports.report(std::move(change), ChangeReports::Kind::userFonts);
+    co_await std::move(reporting);
+    helper.store.changeWasReported();
 }
 
 int run(const Options& options)
@@ -131,7 +137,8 @@ int run(const Options& options)
                                    .fontAssets = helper.fontAssets,
                                    .identities = helper.identities,
                                    .reports = helper.reports,
-                                   .log = helper.log},
+                                   .log = helper.log,
+                                   .changes = *helper.changes},
         OwnUser{.user = ::geteuid(), .isServiceUser = !helper.root.isScratch() && runsAsServiceUser()});
     const bool isSocketActivated = sd_listen_fds(0) > 0;
     if (!isSocketActivated && !HelperLife::awaitName(helper.root)) {
@@ -141,11 +148,10 @@ int run(const Options& options)
     if (const auto error = isSocketActivated ? std::nullopt : HelperLife::announce(helper.root)) {
         TYLog_Error(helper.log, *error);
     }
+    helper.changes->async(reportCompleted(helper, std::move(opening.change)));
     const auto listener = startFontRegistryService(helper.ipc, service);
     HelperLife life(helper.root, {.idle = std::chrono::seconds(options.idleSeconds),
                                   .isSocketActivated = isSocketActivated});
-    const auto reporting = helper.queues.createSerialQueue("com.vorlan.typhond.interruptedChange");
-    reporting->async(reportCompleted(helper, std::move(opening.change)));
     waitForTheEnd(life, *service, helper.log);
     listener->invalidate();
     if (!isSocketActivated) {

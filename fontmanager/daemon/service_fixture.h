@@ -16,6 +16,7 @@
 #include <memory>
 #include <mutex>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -86,15 +87,23 @@ public:
         const std::lock_guard lock(mutex_);
         return std::exchange(lines_, {});
     }
+    /// The labels of the queues on which something was reported.
+    std::set<std::string> queues()
+    {
+        const std::lock_guard lock(mutex_);
+        return queues_;
+    }
 
 private:
     void add(std::string line)
     {
         const std::lock_guard lock(mutex_);
         lines_.push_back(std::move(line));
+        queues_.insert(WorkItem::current()->queue.label());
     }
     std::mutex mutex_;
     std::vector<std::string> lines_;
+    std::set<std::string> queues_;
 };
 
 class RunningService {
@@ -110,7 +119,8 @@ public:
                                                                              .fontAssets = fontAssets,
                                                                              .identities = identities,
                                                                              .reports = reports,
-                                                                             .log = log},
+                                                                             .log = log,
+                                                                             .changes = *changes},
                                                   OwnUser{.user = ::geteuid()});
         listener = startFontRegistryService(ipc, service);
         identities.becomeAdministrator();
@@ -126,6 +136,7 @@ public:
     LinuxLog log{LogLevel::error, LinuxLog::Destination::descriptor, -1};
     EventPool pool;
     LinuxWorkQueues queues{pool};
+    std::shared_ptr<WorkQueue> changes = queues.createSerialQueue("com.vorlan.typhond.fontChanges");
     DecidedIdentities identities;
     KeptReports reports;
     FontStore store;
