@@ -70,9 +70,11 @@ Options parsed(int argc, char** argv)
         ->type_name("DIR");
     const std::map<std::string, LogLevel> levels{
         {"debug", LogLevel::debug}, {"default", LogLevel::defaultLevel}, {"error", LogLevel::error}};
-    app.add_option("--log-level", options.logLevel, "Least level that is logged: debug, default or error")
+    app.add_option_function<std::string>(
+           "--log-level", [&](const std::string& level) { options.logLevel = levels.at(level); },
+           "Least level that is logged")
         ->type_name("LEVEL")
-        ->transform(CLI::Transformer(levels));
+        ->check(CLI::IsMember({"debug", "default", "error"}));
     app.add_option(
            "--idle", options.idleSeconds,
            "End after this long without a connection, where the service manager or no font daemon runs")

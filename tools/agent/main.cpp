@@ -20,11 +20,12 @@ int main(int argumentCount, char** arguments)
                                                           {"first", typhon::AnswerMode::first},
                                                           {"none", typhon::AnswerMode::none}};
     parser
-        .add_option("--answer", mode,
-                    "ask (the user, the default), first (switch every font on from its first provider) or "
-                    "none; the last two need no terminal")
+        .add_option_function<std::string>(
+            "--answer", [&](const std::string& how) { mode = modes.at(how); },
+            "ask (the user, the default), first (switch every font on from its first provider) or "
+            "none; the last two need no terminal")
         ->type_name("HOW")
-        ->transform(CLI::CheckedTransformer(modes));
+        ->check(CLI::IsMember({"ask", "first", "none"}));
     try {
         parser.parse(argumentCount, arguments);
     } catch (const CLI::ParseError& error) {

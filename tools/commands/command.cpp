@@ -78,7 +78,7 @@ void addCommands(CLI::App& parser, Invocation& invocation)
 
 int runCommandLine(const std::vector<std::string>& words)
 {
-    CLI::App parser{"Keys, signatures, sandboxes, check-ins, changes and preferences of typhond",
+    CLI::App parser{"Fonts, what programs see of them, signed identities, sandboxes and the administration of typhond",
                     "typhonctl"};
     Invocation invocation;
     parser

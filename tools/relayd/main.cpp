@@ -41,9 +41,11 @@ Options parsed(int argc, char** argv)
         ->type_name("DIR");
     const std::map<std::string, LogLevel> levels{
         {"debug", LogLevel::debug}, {"default", LogLevel::defaultLevel}, {"error", LogLevel::error}};
-    app.add_option("--log-level", options.logLevel, "Least level that is logged: debug, default or error")
+    app.add_option_function<std::string>(
+           "--log-level", [&](const std::string& level) { options.logLevel = levels.at(level); },
+           "Least level that is logged")
         ->type_name("LEVEL")
-        ->transform(CLI::Transformer(levels));
+        ->check(CLI::IsMember({"debug", "default", "error"}));
     app.add_option("--removal-window", options.removalWindow,
                    "Seconds for which an application's desktop entry may be missing, as in an upgrade")
         ->type_name("SECONDS")
