@@ -3,7 +3,8 @@
 include(GNUInstallDirs)
 install(TARGETS typhond typhon-relayd DESTINATION ${CMAKE_INSTALL_SBINDIR})
 install(TARGETS typhonctl typhon-agent DESTINATION ${CMAKE_INSTALL_BINDIR})
-install(TARGETS typhon-fontmanagerd typhon-font-parser DESTINATION ${CMAKE_INSTALL_LIBEXECDIR}/typhon)
+install(TARGETS typhon-fontmanagerd typhon-font-parser typhon-asset-downloader
+    DESTINATION ${CMAKE_INSTALL_LIBEXECDIR}/typhon)
 
 file(GLOB units CONFIGURE_DEPENDS packaging/systemd/*.service packaging/systemd/*.socket)
 install(FILES ${units} DESTINATION lib/systemd/system)

@@ -79,7 +79,12 @@ struct LinuxServices {
     LinuxUserFontManager userFontManager{root, log};
     LinuxAnalytics analytics{root, log};
     LinuxNotifications notifications{pool, queues, log, root};
-    LinuxAssetService assetService{pool, log, root};
+    LinuxAssetService assetService{
+        pool,
+        log,
+        root,
+        {.post = [this](const std::string& name) { notifications.postNotifyCentreNotification(name); },
+         .downloader = {}}};
     LinuxFileEvents fileEvents{pool, queues, log, root};
     LinuxBackgroundActivities backgroundActivities{
         {.queues = queues, .clock = clock, .log = log, .random = randomFraction}, root};

@@ -1,6 +1,7 @@
 #include "fontmanager/font_zygote.h"
 
 #include "platform/linux/regular_file.h"
+#include "platform/linux/started_program.h"
 #include "platform/linux/visible_text.h"
 
 #include <array>
@@ -11,66 +12,16 @@
 #include <span>
 #include <utility>
 
-#include <fcntl.h>
 #include <poll.h>
-#include <spawn.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
 #include <unistd.h>
-
-// The caller has threads, so the program is spawned, not forked. It gets the socket and nothing else: no
-// environment, no other descriptor, no signal setting, and a session of its own, so that no Ctrl-C ends it.
 
 namespace typhon {
 
 namespace {
 
 using Clock = std::chrono::steady_clock;
-
-struct FileActions {
-    posix_spawn_file_actions_t actions;
-    FileActions() { ::posix_spawn_file_actions_init(&actions); }
-    ~FileActions() { ::posix_spawn_file_actions_destroy(&actions); }
-    FileActions(const FileActions&) = delete;
-    FileActions& operator=(const FileActions&) = delete;
-};
-
-struct SpawnAttributes {
-    posix_spawnattr_t attributes;
-    SpawnAttributes()
-    {
-        ::posix_spawnattr_init(&attributes);
-        sigset_t all;
-        sigset_t none;
-        ::sigfillset(&all);
-        ::sigemptyset(&none);
-        ::posix_spawnattr_setsigdefault(&attributes, &all);
-        ::posix_spawnattr_setsigmask(&attributes, &none);
-        ::posix_spawnattr_setflags(&attributes,
-                                   POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSID);
-    }
-    ~SpawnAttributes() { ::posix_spawnattr_destroy(&attributes); }
-    SpawnAttributes(const SpawnAttributes&) = delete;
-    SpawnAttributes& operator=(const SpawnAttributes&) = delete;
-};
-
-/// Starts the program with `control` as standard input; its process, or the negative errno.
-pid_t spawn(const std::string& program, int control)
-{
-    FileActions files;
-    ::posix_spawn_file_actions_adddup2(&files.actions, control, STDIN_FILENO);
-    ::posix_spawn_file_actions_addopen(&files.actions, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
-    ::posix_spawn_file_actions_addopen(&files.actions, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
-    ::posix_spawn_file_actions_addclosefrom_np(&files.actions, STDERR_FILENO + 1);
-    const SpawnAttributes attributes;
-    std::string name = program;
-    std::array<char*, 2> arguments{name.data(), nullptr};
-    std::array<char*, 1> environment{nullptr};
-    pid_t process = -1;
-    const int error = ::posix_spawn(&process, program.c_str(), &files.actions, &attributes.attributes,
-                                    arguments.data(), environment.data());
-    return error == 0 ? process : -error;
-}
 
 /// The milliseconds until then, for poll.
 int remaining(Clock::time_point deadline)
@@ -167,7 +118,7 @@ void FontZygote::start(const std::string& program)
     }
     control_ = FileDescriptor(pair[0]);
     const FileDescriptor theirs(pair[1]);
-    process_ = spawn(program, theirs.get());
+    process_ = startProgram(program, theirs.get());
     if (process_ < 0) {
         problem_ = "cannot start the font reader " + visibleText(program) + ": " + errorText(-process_);
     }

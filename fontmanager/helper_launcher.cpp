@@ -4,14 +4,13 @@
 #include "fontmanager/helper_files.h"
 #include "platform/linux/durable_file.h"
 #include "platform/linux/regular_file.h"
+#include "platform/linux/started_program.h"
 #include "sdk/client_errors.h"
 
 #include <array>
 #include <cerrno>
 #include <chrono>
 #include <csignal>
-#include <filesystem>
-#include <system_error>
 #include <vector>
 
 #include <fcntl.h>
@@ -132,17 +131,7 @@ ClientResult<ServiceConnection> startAndConnect(const RootDirectory& root, const
 
 std::optional<std::string> helperProgram()
 {
-    std::error_code error;
-    const auto own = std::filesystem::read_symlink("/proc/self/exe", error).parent_path();
-    // Beside this program, where both were installed together, or on the system.
-    for (const auto& folder :
-         {own, own / "../libexec/typhon", std::filesystem::path("/usr/libexec/typhon")}) {
-        const auto candidate = (folder / helper_files::program).string();
-        if (!folder.empty() && ::access(candidate.c_str(), X_OK) == 0) {
-            return candidate;
-        }
-    }
-    return std::nullopt;
+    return installedProgram(helper_files::program);
 }
 
 ClientResult<ServiceConnection> connectToHelper(const RootDirectory& root,

@@ -1,6 +1,6 @@
 #include "fontmanager/parser_confinement.h"
 
-#include "fontmanager/syscall_filter.h"
+#include "platform/linux/syscall_filter.h"
 
 #include <cerrno>
 #include <csignal>

@@ -101,6 +101,24 @@ AssetStore::Listing AssetStore::assets(const std::string& assetType)
     return result;
 }
 
+std::optional<std::uint64_t> AssetStore::sizeOf(const std::string& assetType,
+                                                const std::string& assetId) const
+{
+    const auto path = directoryOfType(assetType) + "/" + assetId + "/AssetData";
+    const FileDescriptor data(isValidAssetId(assetId) ? ::open(path.c_str(), directoryFlags) : -1);
+    if (!data) {
+        return std::nullopt;
+    }
+    std::uint64_t size = 0;
+    for (const auto& name : listDirectory(data.get(), mostAssets).files) {
+        struct stat status {};
+        if (::fstatat(data.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0) {
+            size += static_cast<std::uint64_t>(status.st_size);
+        }
+    }
+    return size;
+}
+
 std::optional<std::string> AssetStore::replaceCatalogue(const std::string& assetType, const Bytes& contents)
 {
     const auto path = fileOfCatalogue(assetType);

@@ -37,6 +37,9 @@ public:
     /// as listed: nothing may be removed because a catalogue is missing or broken.
     Listing assets(const std::string& assetType);
 
+    /// How many bytes the files of an installed asset have; null for one that is not installed.
+    std::optional<std::uint64_t> sizeOf(const std::string& assetType, const std::string& assetId) const;
+
     /// The present catalogue of a type, if it counts; null with an error otherwise.
     Result<AssetCatalogue> catalogue(const std::string& assetType);
 

@@ -1,11 +1,17 @@
 #include "platform/linux/linux_asset_service.h"
 
+#include "platform/linux/catalogue_source.h"
+#include "platform/linux/visible_text.h"
+
 #include <algorithm>
 #include <utility>
 
 namespace typhon {
 
 namespace {
+
+/// Slow enough to leave the network to others; the largest catalogue takes some four minutes.
+constexpr std::uint64_t discretionaryBytesPerSecond = 256 << 10;
 
 class Asset final : public KGAsset {
 public:
@@ -114,8 +120,9 @@ private:
 
 }  // namespace
 
-LinuxAssetService::LinuxAssetService(EventPool& pool, Log& log, RootDirectory root)
-    : pool_(pool), log_(log), root_(std::move(root)), store_(root_, log)
+LinuxAssetService::LinuxAssetService(EventPool& pool, Log& log, RootDirectory root, Options options)
+    : pool_(pool), log_(log), root_(std::move(root)), options_(std::move(options)), store_(root_, log),
+      downloads_(pool, root_, options_.downloader)
 {}
 
 std::shared_ptr<KGAssetQuery> LinuxAssetService::queryWithType(const std::string& type)
@@ -123,15 +130,52 @@ std::shared_ptr<KGAssetQuery> LinuxAssetService::queryWithType(const std::string
     return std::make_shared<Query>(pool_, store_, type);
 }
 
-void LinuxAssetService::startCatalogDownload(const std::string& type, KGDownloadOptions /*options*/,
+void LinuxAssetService::startCatalogDownload(const std::string& type, KGDownloadOptions options,
                                              std::function<void(std::int64_t)> then)
 {
-    TYLog_Error(log_, "the catalogue of " + type + " is not fetched: this version cannot download");
-    pool_.post([then = std::move(then)] {
-        if (then) {
-            then(downloadsUnsupported);
-        }
+    if (!then) {
+        then = [](std::int64_t) {};
+    }
+    pool_.post([this, type, discretionary = options.discretionary(), then = std::move(then)]() mutable {
+        download(type, discretionary, std::move(then));
     });
+}
+
+void LinuxAssetService::download(const std::string& type, bool discretionary, Then then)
+{
+    const auto [source, isConfigured] = catalogueSourceOf(root_, type);
+    if (!source.value) {
+        log_.write(LogSink::daemon, isConfigured ? LogLevel::error : LogLevel::defaultLevel,
+                   "the catalogue of " + visibleText(type, 300) + " is not fetched: " + source.error);
+        then(isConfigured ? results::notFetched : results::noSource);
+        return;
+    }
+    const DownloadRequest request{.url = source.value->url,
+                                  .certificates = source.value->certificates,
+                                  .mostBytes = catalogueFileLimit,
+                                  .bytesPerSecond = discretionary ? discretionaryBytesPerSecond : 0,
+                                  .stallSeconds = source.value->stallSeconds,
+                                  .totalSeconds = source.value->totalSeconds};
+    downloads_.start(
+        request, discretionary,
+        [this, type, then = std::move(then)](const DownloadAnswer& answer) { then(accept(type, answer)); });
+}
+
+std::int64_t LinuxAssetService::accept(const std::string& type, const DownloadAnswer& answer)
+{
+    if (!answer.error.empty()) {
+        TYLog_Error(log_, "the catalogue of " + type + " is not fetched: " + answer.error);
+        return results::notFetched;
+    }
+    if (store_.replaceCatalogue(type, answer.contents)) {
+        // The store has said why.
+        return results::refused;
+    }
+    TYLog(log_, "the catalogue of " + type + " was fetched");
+    if (options_.post) {
+        options_.post(type + ".kg.cached-metadata-updated");
+    }
+    return results::success;
 }
 
 }  // namespace typhon

@@ -24,6 +24,8 @@ constexpr const char* criteriaDirectory = "/etc/typhon/activities.d/";
 constexpr const char* lastRunPrefix = "/var/mobile/Library/Preferences/com.vorlan.typhond.activity.";
 constexpr PropertyListLimits fileLimits{.bytes = 16 * 1024, .depth = 2, .values = 32};
 constexpr double shortestInterval = 60;
+/// Of a scratch system, to see things happen.
+constexpr double shortestScratchInterval = 1;
 constexpr double longestInterval = 366.0 * 24 * 60 * 60;
 constexpr std::size_t mostSupplies = 64;
 
@@ -44,13 +46,13 @@ PropertyList fileAt(const std::string& path)
     return reading.value ? *std::move(reading.value) : PropertyList();
 }
 
-ActivityCriteria criteriaFrom(const PropertyList& file)
+ActivityCriteria criteriaFrom(const PropertyList& file, double shortest)
 {
     ActivityCriteria criteria;
     const auto* interval = file.find("Interval");
     if (interval != nullptr && interval->asInteger() != nullptr) {
         criteria.intervalSeconds =
-            std::clamp(static_cast<double>(*interval->asInteger()), shortestInterval, longestInterval);
+            std::clamp(static_cast<double>(*interval->asInteger()), shortest, longestInterval);
     }
     const auto* allowsBattery = file.find("AllowBattery");
     criteria.allowsBattery = allowsBattery != nullptr && allowsBattery->isTrue();
@@ -92,7 +94,9 @@ public:
                WorkQueue& queue)
         : services_(services), root_(std::move(root)), lastRunPath_(lastRunPrefix + name + ".plist"),
           name_(name), handler_(std::move(handler)),
-          criteria_(criteriaFrom(fileAt(root_.real(criteriaDirectory + name + ".plist")))), queue_(queue)
+          criteria_(criteriaFrom(fileAt(root_.real(criteriaDirectory + name + ".plist")),
+                                 root_.isScratch() ? shortestScratchInterval : shortestInterval)),
+          queue_(queue)
     {}
 
     void checkIn()

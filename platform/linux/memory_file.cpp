@@ -14,16 +14,6 @@ namespace {
 constexpr int requiredSeals = F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE;
 constexpr unsigned notExecutable = 0x0008U;  // MFD_NOEXEC_SEAL, which older headers lack
 
-FileDescriptor emptyMemoryFile()
-{
-    constexpr unsigned flags = MFD_CLOEXEC | MFD_ALLOW_SEALING;
-    int file = ::memfd_create("typhon", flags | notExecutable);
-    if (file < 0 && errno == EINVAL) {
-        file = ::memfd_create("typhon", flags);
-    }
-    return FileDescriptor(file);
-}
-
 bool writeAll(int file, std::span<const std::uint8_t> bytes)
 {
     while (!bytes.empty()) {
@@ -58,11 +48,25 @@ bool readAll(int file, std::span<std::uint8_t> bytes)
 
 }  // namespace
 
+FileDescriptor emptyMemoryFile()
+{
+    constexpr unsigned flags = MFD_CLOEXEC | MFD_ALLOW_SEALING;
+    int file = ::memfd_create("typhon", flags | notExecutable);
+    if (file < 0 && errno == EINVAL) {
+        file = ::memfd_create("typhon", flags);
+    }
+    return FileDescriptor(file);
+}
+
+bool sealMemoryFile(int memoryFile)
+{
+    return ::fcntl(memoryFile, F_ADD_SEALS, requiredSeals | F_SEAL_SEAL) == 0;
+}
+
 FileDescriptor sealedMemoryFile(std::span<const std::uint8_t> bytes)
 {
     auto file = emptyMemoryFile();
-    if (!file || !writeAll(file.get(), bytes) ||
-        ::fcntl(file.get(), F_ADD_SEALS, requiredSeals | F_SEAL_SEAL) != 0) {
+    if (!file || !writeAll(file.get(), bytes) || !sealMemoryFile(file.get())) {
         return {};
     }
     return file;

@@ -11,6 +11,12 @@
 
 namespace typhon {
 
+/// An empty memory file to write to, or none when the system has no memory files.
+FileDescriptor emptyMemoryFile();
+
+/// Seals it against all changes, forever. False when somebody still has it mapped for writing.
+bool sealMemoryFile(int memoryFile);
+
 /// A sealed memory file with these bytes, or none when the system has no memory files or no room.
 FileDescriptor sealedMemoryFile(std::span<const std::uint8_t> bytes);
 

@@ -3,6 +3,7 @@
 #include "platform/linux/asset_store.h"
 #include "platform/linux/durable_file.h"
 #include "platform/linux/regular_file.h"
+#include "tools/catalogue_fetch.h"
 #include "tools/commands/command.h"
 #include "tools/complaints.h"
 #include "tools/notification_post.h"
@@ -59,25 +60,34 @@ int announce(const Invocation& invocation, const std::string& type, const std::s
     return exitSuccess;
 }
 
+PropertyList listed(const StoredAsset& asset, const std::optional<std::uint64_t>& size)
+{
+    PropertyList::Dictionary entry{
+        {"assetId", asset.assetId}, {"attributes", asset.attributes}, {"state", asset.state}};
+    if (size) {
+        entry.emplace("size", static_cast<std::int64_t>(*size));
+    }
+    return entry;
+}
+
 int list(const Invocation& invocation, const TypeOptions& options)
 {
     Complaints complaints;
     const auto root = invocation.root();
-    const auto listing = AssetStore(root, complaints).assets(options.type);
+    AssetStore store(root, complaints);
+    const auto listing = store.assets(options.type);
     if (listing.error) {
         return fail(*listing.error);
     }
-    if (invocation.json) {
-        PropertyList::Array assets;
-        for (const auto& asset : listing.assets) {
-            assets.emplace_back(PropertyList::Dictionary{
-                {"assetId", asset.assetId}, {"attributes", asset.attributes}, {"state", asset.state}});
-        }
-        return printJson(jsonOf(PropertyList(std::move(assets))));
-    }
-    Table table({"ASSET", "STATE"});
+    PropertyList::Array assets;
+    Table table({"ASSET", "STATE", "SIZE"});
     for (const auto& asset : listing.assets) {
-        table.addRow({asset.assetId, nameOfState(asset.state)});
+        const auto size = store.sizeOf(options.type, asset.assetId);
+        assets.push_back(listed(asset, size));
+        table.addRow({asset.assetId, nameOfState(asset.state), size ? std::to_string(*size) : "-"});
+    }
+    if (invocation.json) {
+        return printJson(jsonOf(PropertyList(std::move(assets))));
     }
     return print(table.rowCount() == 0 ? "There are no assets of " + options.type + ".\n" : table.text());
 }
@@ -146,6 +156,12 @@ int makeCatalogueFile(const Invocation&, const CatalogueOptions& options)
     }
     const auto failure = replaceFile(fs::absolute(options.output).string(), *contents.value, 0644);
     return failure ? fail(*failure) : exitSuccess;
+}
+
+int fetch(const Invocation& invocation, const TypeOptions& options)
+{
+    const auto fetched = fetchCatalogue(invocation.root(), options.type);
+    return fetched ? print(*fetched) : fail(fetched.error().message, fetched.error().advice);
 }
 
 int setCatalogue(const Invocation& invocation, const FileOptions& options)
@@ -241,6 +257,11 @@ void addAssetsCommand(CLI::App& parser, Invocation& invocation)
     addCommand<CatalogueOptions>(command, invocation, "make-catalogue",
                                  "Make and sign a catalogue of a folder of assets", makeCatalogueFile,
                                  declareMake);
+    addCommand<TypeOptions>(
+        command, invocation, "fetch-catalogue",
+        "Fetch the catalogue of a type from its source, and make it the present one under "
+        "the conditions of set-catalogue",
+        fetch, [](CLI::App& fetch, TypeOptions& options) { declareType(fetch, options); });
     addCommand<FileOptions>(command, invocation, "set-catalogue",
                             "Make a file the catalogue of its type, if its signature counts and it is not "
                             "older than the present one",

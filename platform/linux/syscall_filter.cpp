@@ -1,4 +1,4 @@
-#include "fontmanager/syscall_filter.h"
+#include "platform/linux/syscall_filter.h"
 
 #include <bit>
 #include <cerrno>
@@ -95,11 +95,21 @@ SyscallFilter& SyscallFilter::refuse(long number, int error)
 
 int SyscallFilter::install()
 {
+    return installWith(SECCOMP_RET_KILL_PROCESS);
+}
+
+int SyscallFilter::installRefusing()
+{
+    return installWith(SECCOMP_RET_ERRNO | ENOSYS);
+}
+
+int SyscallFilter::installWith(std::uint32_t otherwise)
+{
     if (architecture == 0) {
         return ENOSYS;
     }
     auto whole = program_;
-    whole.push_back(answer(SECCOMP_RET_KILL_PROCESS));
+    whole.push_back(answer(otherwise));
     const sock_fprog program{static_cast<unsigned short>(whole.size()), whole.data()};
     return ::syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, 0, &program) == 0 ? 0 : errno;
 }

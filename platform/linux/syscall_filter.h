@@ -7,9 +7,9 @@
 
 namespace typhon {
 
-/// A list of the only system calls that a process may make from now on; any other kills it at once. So does
-/// any call of another architecture than the one this was built for, and of the x32 convention. Where no
-/// architecture is known, nothing can be installed.
+/// A list of the only system calls that a process may make from now on; any other kills it at once, or fails.
+/// Any call of another architecture than the one this was built for, and of the x32 convention, kills it in
+/// either case. Where no architecture is known, nothing can be installed.
 class SyscallFilter {
 public:
     /// What an argument must be for a call to be allowed. Arguments are compared in their lower 32 bits,
@@ -31,8 +31,13 @@ public:
     /// Installs it for this thread and what it starts, forever. 0 or an errno. The process must have given
     /// up new privileges before.
     int install();
+    /// The same, but other calls fail as those do that the kernel does not have. For work of which it cannot
+    /// be known what all the libraries try.
+    int installRefusing();
 
 private:
+    int installWith(std::uint32_t otherwise);
+
     std::vector<sock_filter> program_;
 };
 
