@@ -1,91 +1,20 @@
 """Applications that ask for fonts that they lack, with the user at a terminal."""
 
 import json
-import os
-import pathlib
-import plistlib
 import shutil
 import signal
 import subprocess
-import sys
 import unittest
 
-from scratch_system import BIN, FONT_FILES, REGISTRY, ScratchSystem, eventually
-from terminals import DOWN, ENTER, ESCAPE, RIGHT, TerminalProgram
+from requesting_system import FOUNDRY, OTHER, OTHER_SERIF_PATH, SANS_PATH, SERIF, SERIF_PATH, RequestingSystem
+from scratch_system import BIN, eventually
+from terminals import DOWN, ENTER, ESCAPE, RIGHT
 
-DEJAVU = pathlib.Path("/usr/share/fonts/truetype/dejavu")
-SANS, SERIF = DEJAVU / "DejaVuSans.ttf", DEJAVU / "DejaVuSerif.ttf"
-FOUNDRY, OTHER = "org.example.foundry", "org.example.otherfoundry"
-SANS_PATH = f"{FONT_FILES}/{FOUNDRY}/DejaVuSans.ttf"
-SERIF_PATH = f"{FONT_FILES}/{FOUNDRY}/DejaVuSerif.ttf"
-OTHER_SERIF_PATH = f"{FONT_FILES}/{OTHER}/DejaVuSerif.ttf"
 ASKED = ["--family", "DejaVu Sans", "--family", "DejaVu Serif", "--family", "Nowhere Sans"]
-AGENT_IDENTIFIER = "com.vorlan.FontInstallViewService"
 BACKGROUND = "tried to show missing fonts dialog in the background"
 
 
-class Requests(unittest.TestCase):
-    def setUp(self):
-        self.system = ScratchSystem()
-        self.addCleanup(self.system.close)
-        for identifier in (FOUNDRY, OTHER, "org.example.writer"):
-            self.system.install_application(identifier)
-        self.writer = self.system.program("org.example.writer", ["app-usage"])
-        self.system.start()
-        self.system.ctl("fonts", "install", "--identifier", FOUNDRY, SANS, SERIF)
-        self.system.ctl("fonts", "install", "--identifier", OTHER, SERIF)
-        self.system.ctl("fonts", "disable", SERIF_PATH, OTHER_SERIF_PATH)
-
-    # -- programs
-
-    def agent_program(self, identifier=AGENT_IDENTIFIER):
-        path = self.system.folder / f"agent-{identifier}"
-        if not path.exists():
-            shutil.copy(BIN / "typhon-agent", path)
-            with path.open("ab") as file:
-                file.write(f"\nof {self.system.folder} {identifier}".encode())
-            if identifier:
-                self.system.sign(path, identifier)
-        return path
-
-    def in_terminal(self, *command, **options):
-        program = TerminalProgram(*command, **options)
-        self.addCleanup(program.close)
-        return program
-
-    def start_agent(self, *options, **terminal):
-        agent = self.in_terminal(self.agent_program(), "--root", self.system.root, *options, **terminal)
-        agent.wait_for("waiting for applications")
-        return agent
-
-    def sandboxed(self, *words):
-        return [BIN / "typhonctl", "--root", self.system.root, "run", "--", self.writer, "--root",
-                self.system.root, *words]
-
-    def ready_shell(self, script, *arguments):
-        """A shell on a terminal of its own, which goes on at a line from the keyboard."""
-        shell = self.in_terminal("/bin/bash", "-c", f"echo ready; read line; {script}", "shell", *arguments)
-        shell.wait_for("ready")
-        return shell
-
-    def ask(self, *names, agent=True):
-        """A sandboxed application in the foreground of a terminal that asks for fonts."""
-        shell = self.ready_shell('exec "$@"', *self.sandboxed("--json", "request", *names))
-        if agent:
-            self.system.daemon.wait_for_line(f"shows terminal {shell.number}")
-        shell.send(b"\n")
-        return shell
-
-    def given(self, application):
-        """The fonts that it was given in the end, by path."""
-        self.assertEqual(application.wait(), 0, application.text())
-        eventually(lambda: "}" in application.text())
-        text = application.plain_text()
-        return json.loads(text[text.index("{"):text.rindex("}") + 1])
-
-    def registry(self):
-        return plistlib.loads(self.system.real(REGISTRY).read_bytes())
-
+class Requests(RequestingSystem):
     # -- the whole request
 
     def test_a_document_gets_a_font_that_the_user_switches_on_and_keeps_it(self):
