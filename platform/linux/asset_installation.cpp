@@ -8,8 +8,10 @@
 #include "platform/linux/visible_text.h"
 
 #include <cerrno>
+#include <utility>
 
 #include <fcntl.h>
+#include <linux/openat2.h>
 #include <stdio.h>
 #include <sys/sendfile.h>
 #include <unistd.h>
@@ -19,54 +21,71 @@ namespace typhon {
 namespace {
 
 constexpr std::size_t mostFiles = 4096;
-constexpr off_t largestFile = off_t(512) << 20;
 constexpr mode_t directoryPermissions = 0755;
 constexpr mode_t filePermissions = 0644;
 constexpr int directoryFlags = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
 
-std::optional<std::string> copyFile(int fromDirectory, const std::string& name, int toDirectory,
-                                    const Sha256& listed)
+std::optional<std::string> copyFile(int fromDirectory, const std::string& name, int toDirectory)
 {
     const auto from = openRegularFile(name, fromDirectory);
-    if (from.error != 0 || from.status.st_size > largestFile) {
+    if (from.error != 0 || static_cast<std::uint64_t>(from.status.st_size) > largestAssetFile) {
         return visibleText(name) + ": " + (from.error != 0 ? from.errorText() : "it is too large");
     }
     const FileDescriptor to(
-        ::openat(toDirectory, name.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC | O_NOFOLLOW, 0600));
+        ::openat(toDirectory, name.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC | O_NOFOLLOW, 0600));
     bool isCopied(to);
     for (off_t at = 0; isCopied && at < from.status.st_size;) {
         isCopied = ::sendfile(to.get(), from.file.get(), &at,
                               static_cast<std::size_t>(from.status.st_size - at)) > 0;
     }
-    if (!isCopied || ::fchmod(to.get(), filePermissions) != 0 || ::fsync(to.get()) != 0) {
-        return "cannot copy " + visibleText(name) + ": " + errorText(errno);
-    }
-    return sha256OfFile(to.get()) == listed
-               ? std::nullopt
-               : std::optional(visibleText(name) + " is not the file that the catalogue lists");
+    return isCopied ? std::nullopt
+                    : std::optional("cannot copy " + visibleText(name) + ": " + errorText(errno));
 }
 
-std::optional<std::string> copyFiles(const std::string& asset, const ListedAsset& listed,
-                                     const std::string& folder)
+/// Looks at what has been put there, whoever did it, and makes it last.
+std::optional<std::string> finishFile(int directory, const std::string& name, const Sha256& listed)
 {
-    const FileDescriptor from(::open(folder.c_str(), directoryFlags));
-    if (!from) {
-        return "cannot open " + visibleText(folder) + ": " + errorText(errno);
+    const auto opened = openRegularFile(name, directory, RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS);
+    if (opened.error != 0) {
+        return visibleText(name) + ": " + opened.errorText();
     }
-    if (auto error = makeDirectories(asset + "/AssetData", directoryPermissions)) {
-        return error;
+    if (sha256OfFile(opened.file.get()) != listed) {
+        return visibleText(name) + " is not the file that the catalogue lists";
     }
-    const FileDescriptor to(::open((asset + "/AssetData").c_str(), directoryFlags));
+    return ::fchmod(opened.file.get(), filePermissions) == 0 && ::fsync(opened.file.get()) == 0
+               ? std::nullopt
+               : std::optional("cannot keep " + visibleText(name) + ": " + errorText(errno));
+}
+
+std::optional<std::string> finishFiles(int directory, const ListedAsset& listed)
+{
     for (const auto& [name, digest] : listed.files) {
-        if (auto error = copyFile(from.get(), name, to.get(), digest)) {
+        if (auto error = finishFile(directory, name, digest)) {
             return error;
         }
     }
-    if (auto error =
-            replaceFile(asset + "/Info.plist", writeBinaryPropertyList(listed.attributes), filePermissions)) {
+    const auto listing = listDirectory(directory, listed.files.size() + 1);
+    return listing.files.size() == listed.files.size() && listing.directories.empty()
+               ? std::nullopt
+               : std::optional<std::string>("there is more than the catalogue lists");
+}
+
+std::optional<std::string> putTogether(const std::string& asset, const ListedAsset& listed,
+                                       const FillAsset& fill)
+{
+    if (auto error = makeDirectories(asset + "/AssetData", directoryPermissions)) {
         return error;
     }
-    return flushDirectory(asset + "/AssetData");
+    const FileDescriptor data(::open((asset + "/AssetData").c_str(), directoryFlags));
+    auto error = fill(data.get(), listed);
+    if (!error) {
+        error = finishFiles(data.get(), listed);
+    }
+    if (!error) {
+        error =
+            replaceFile(asset + "/Info.plist", writeBinaryPropertyList(listed.attributes), filePermissions);
+    }
+    return error ? error : flushDirectory(asset + "/AssetData");
 }
 
 /// Exchanges with what is installed, so that there is no moment without the asset.
@@ -112,8 +131,23 @@ Result<std::map<std::string, Sha256>> digestsOfFolder(const std::string& folder)
     return {std::move(digests), {}};
 }
 
+FillAsset fromFolder(std::string folder)
+{
+    return [folder = std::move(folder)](int directory, const ListedAsset& listed) {
+        const FileDescriptor from(::open(folder.c_str(), directoryFlags));
+        std::optional<std::string> error;
+        if (!from) {
+            error = "cannot open " + visibleText(folder) + ": " + errorText(errno);
+        }
+        for (auto file = listed.files.begin(); !error && file != listed.files.end(); ++file) {
+            error = copyFile(from.get(), file->first, directory);
+        }
+        return error;
+    };
+}
+
 std::optional<std::string> installAsset(const std::string& store, const std::string& assetId,
-                                        const ListedAsset& listed, const std::string& folder)
+                                        const ListedAsset& listed, const FillAsset& fill)
 {
     const FileDescriptor directory(::open(store.c_str(), directoryFlags | O_NOFOLLOW));
     if (!directory) {
@@ -125,7 +159,7 @@ std::optional<std::string> installAsset(const std::string& store, const std::str
         return lock.error();
     }
     removeIfThere(directory.get(), temporary);
-    auto error = copyFiles(store + "/" + temporary, listed, folder);
+    auto error = putTogether(store + "/" + temporary, listed, fill);
     if (!error) {
         error = putInPlace(directory.get(), temporary, assetId);
     }

@@ -150,7 +150,7 @@ std::optional<std::string> AssetStore::replaceCatalogue(const std::string& asset
 }
 
 std::optional<std::string> AssetStore::install(const std::string& assetType, const std::string& assetId,
-                                               const std::string& folder)
+                                               const FillAsset& fill)
 {
     const auto listed = catalogue(assetType);
     if (!listed.value) {
@@ -164,7 +164,7 @@ std::optional<std::string> AssetStore::install(const std::string& assetType, con
     if (auto error = makeDirectories(store, directoryPermissions)) {
         return error;
     }
-    return installAsset(store, assetId, found->second, folder);
+    return installAsset(store, assetId, found->second, fill);
 }
 
 std::optional<std::string> AssetStore::purge(const std::string& assetType, const std::string& assetId)

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/linux/asset_catalogue.h"
+#include "platform/linux/asset_installation.h"
 #include "platform/linux/root_directory.h"
 #include "platform/log.h"
 
@@ -47,10 +48,16 @@ public:
     /// key that counts, are for another type, or are older than the present one. Null, or why not.
     std::optional<std::string> replaceCatalogue(const std::string& assetType, const Bytes& contents);
 
-    /// Installs the files of a real folder as that asset, in one step. They have to be what the catalogue
-    /// says, no more and no less. Null, or why not.
+    /// Installs that asset, in one step. Its files have to be what the catalogue says, no more and no less.
+    /// Null, or why not.
     std::optional<std::string> install(const std::string& assetType, const std::string& assetId,
-                                       const std::string& folder);
+                                       const FillAsset& fill);
+    /// The same with the files of a real folder; what else is in it does not matter.
+    std::optional<std::string> install(const std::string& assetType, const std::string& assetId,
+                                       const std::string& folder)
+    {
+        return install(assetType, assetId, fromFolder(folder));
+    }
 
     /// Removes an installed asset, in one step. Null, or why not.
     std::optional<std::string> purge(const std::string& assetType, const std::string& assetId);

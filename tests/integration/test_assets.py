@@ -1,11 +1,15 @@
 """Assets from a signed catalogue: installed, synchronised, seen and read by an application, and purged; and the list
 of application versions that may not enumerate."""
 
+import json
+import os
+import pathlib
 import plistlib
 import shutil
+import subprocess
 import unittest
 
-from scratch_system import ASSET_STORE, FONT_ASSETS, ScratchSystem, eventually
+from scratch_system import ASSET_STORE, BIN, FONT_ASSETS, PATIENCE, ScratchSystem, eventually
 
 FONT = "/usr/share/fonts/truetype/dejavu/DejaVuSans.ttf"
 OTHER_FONT = "/usr/share/fonts/truetype/dejavu/DejaVuSans-Bold.ttf"
@@ -53,6 +57,46 @@ class Assets(unittest.TestCase):
         self.system.ctl("assets", "purge", "sans.asset")
         eventually(lambda: self.fonts_of(viewer) == set())
         self.assertFalse(self.system.real(f"{FONT_ASSETS}/sans.asset").exists())
+
+    def test_a_sandboxed_application_opens_and_reads_an_assets_font(self):
+        viewer = self.system.program("org.example.viewer", ["font-enumeration"])
+        plain = self.system.program("org.example.plain")
+        self.system.start()
+        folder = self.asset("sans.asset", FONT)
+        self.publish()
+        archive = self.system.folder / "sans.tar.xz"
+        subprocess.run(["tar", "-cJf", archive, "-C", folder, "."], check=True)
+        self.system.ctl("assets", "install", "sans.asset", archive)
+        path = f"{FONT_ASSETS}/sans.asset/DejaVuSans.ttf"
+        eventually(lambda: path in self.fonts_of(viewer))
+        self.assertEqual(set(self.system.checkin(viewer, sandboxed=True)["fontsInfo"]), {path})
+        opened = self.opened(viewer, path)
+        self.assertEqual(opened.stdout, pathlib.Path(FONT).read_bytes(), opened.stderr)
+        # Its own share of nothing is all that another one gets.
+        refused = self.opened(plain, path)
+        self.assertNotEqual(refused.returncode, 0)
+        self.assertEqual(refused.stdout, b"")
+
+    def opened(self, program, path):
+        """What the program, in a sandbox, gets of that file."""
+        command = [BIN / "typhonctl", "--root", self.system.root, "run", "--", program, "--root", self.system.root,
+                   "open", path]
+        return subprocess.run([str(word) for word in command], capture_output=True, timeout=PATIENCE,
+                              stdin=subprocess.DEVNULL)
+
+    def test_the_list_shows_states_and_sizes(self):
+        folder = self.asset("sans.asset", FONT, OTHER_FONT)
+        self.asset("bold.asset", OTHER_FONT)
+        self.publish()
+        self.system.ctl("assets", "install", "sans.asset", folder)
+        size = sum(os.path.getsize(font) for font in (FONT, OTHER_FONT))
+        text = self.system.ctl("assets", "list").stdout.decode()
+        self.assertEqual([line.split() for line in text.splitlines()],
+                         [["ASSET", "STATE", "SIZE"], ["bold.asset", "listed", "-"],
+                          ["sans.asset", "installed", str(size)]])
+        known = json.loads(self.system.ctl("--json", "assets", "list").stdout)
+        self.assertEqual([(asset["assetId"], asset["state"], asset.get("size")) for asset in known],
+                         [("bold.asset", 1, None), ("sans.asset", 2, size)])
 
     def test_files_that_the_catalogue_does_not_list_are_refused(self):
         folder = self.asset("sans.asset", FONT)

@@ -3,6 +3,7 @@
 #include "platform/linux/asset_store.h"
 #include "platform/linux/durable_file.h"
 #include "platform/linux/regular_file.h"
+#include "tools/asset_archive.h"
 #include "tools/catalogue_fetch.h"
 #include "tools/commands/command.h"
 #include "tools/complaints.h"
@@ -24,7 +25,8 @@ struct TypeOptions {
 };
 struct AssetOptions : TypeOptions {
     std::string assetId;
-    std::string folder;
+    /// A folder or an archive.
+    std::string source;
 };
 struct CatalogueOptions : TypeOptions {
     std::string key;
@@ -96,8 +98,11 @@ int install(const Invocation& invocation, const AssetOptions& options)
 {
     Complaints complaints;
     const auto root = invocation.root();
-    if (const auto error =
-            AssetStore(root, complaints).install(options.type, options.assetId, options.folder)) {
+    std::error_code notThere;
+    const auto files = fs::is_directory(options.source, notThere)
+                           ? fromFolder(options.source)
+                           : fromArchive(options.source, options.assetId);
+    if (const auto error = AssetStore(root, complaints).install(options.type, options.assetId, files)) {
         return fail(*error, storeAdvice);
     }
     return announce(invocation, options.type, "new-asset-installed");
@@ -221,9 +226,11 @@ void declareAsset(CLI::App& command, AssetOptions& options)
 void declareInstall(CLI::App& command, AssetOptions& options)
 {
     declareAsset(command, options);
-    command.add_option("folder", options.folder, "The folder with the asset's files")
+    command
+        .add_option("source", options.source,
+                    "A folder with the asset's files, or a tar archive of them, which may be compressed")
         ->required()
-        ->type_name("FOLDER");
+        ->type_name("SOURCE");
 }
 
 void declareMake(CLI::App& command, CatalogueOptions& options)
@@ -250,9 +257,11 @@ void addAssetsCommand(CLI::App& parser, Invocation& invocation)
     command.require_subcommand(1)->fallthrough();
     addCommand<TypeOptions>(command, invocation, "list", "Show what is listed and installed", list,
                             [](CLI::App& list, TypeOptions& options) { declareType(list, options); });
-    addCommand<AssetOptions>(command, invocation, "install",
-                             "Install a listed asset from a folder, if its files are those of the catalogue",
-                             install, declareInstall);
+    addCommand<AssetOptions>(
+        command, invocation, "install",
+        "Install a listed asset from a folder or an archive, if its files are those of the "
+        "catalogue",
+        install, declareInstall);
     addCommand<AssetOptions>(command, invocation, "purge", "Remove an installed asset", purge, declareAsset);
     addCommand<CatalogueOptions>(command, invocation, "make-catalogue",
                                  "Make and sign a catalogue of a folder of assets", makeCatalogueFile,
