@@ -110,6 +110,7 @@ void TyphonHandler::watchWebContentProcessConnection(const std::shared_ptr<Conne
             self->removeWebContentProcessConnection(present);
         }
     });
+    // For completeness: a connection to an endpoint ends with its peer, without being interrupted before.
     connection->setInterruptionHandler(
         [&log] { systemLog(log, "TYSilkpage checkinForSilkpageProcess connection interruptionHandler."); });
 }

@@ -68,7 +68,6 @@ public:
     ClientCapabilities& clientCapabilities() { return clientCapabilities_; }
     UserFontRegistry& userFontRegistry() { return userFontRegistry_; }
     IssuedPathsLedger& issuedPathsLedger() { return issuedPathsLedger_; }
-    FontNameResolution& fontNameResolution() { return fontNameResolution_; }
     MissingFontsDialog& missingFontsDialog() { return missingFontsDialog_; }
     FontRequests& fontRequests() { return fontRequests_; }
     AssetCatalogueEvents& assetCatalogueEvents() { return *assetCatalogueEvents_; }
@@ -78,6 +77,7 @@ public:
                             BooleanReply reply) override;
     Task<void> fontChanged(PropertyList change, EmptyReply reply) override;
     Task<void> updatingUserFonts(EmptyReply reply) override;
+    Task<void> scheduleFontFilesDeletion(std::vector<std::string> paths) override;
     Task<void> synchronizeFontAssets(std::vector<std::string> paths, OutcomeReply reply) override;
     Task<void> resetIssuedFontsFor(std::string identifier, EmptyReply reply) override;
 
@@ -86,7 +86,6 @@ public:
     Task<void> checkin(OptionalDictionaryReply reply) override;
     Task<void> checkinForFontPicker(OptionalDictionaryReply reply) override;
     Task<void> sendFonts(PropertyList::Array fonts, EmptyReply reply) override;
-    Task<void> scheduleFontFilesDeletion(std::vector<std::string> paths) override;
     Task<void> checkinForSilkpageProcess(std::shared_ptr<ListenerEndpoint> endpoint,
                                          EmptyReply reply) override;
 

@@ -17,7 +17,6 @@
 #include <chrono>
 #include <csignal>
 #include <filesystem>
-#include <map>
 #include <memory>
 #include <string>
 
@@ -68,10 +67,8 @@ Options parsed(int argc, char** argv)
     app.name("typhon-fontmanagerd");
     app.add_option("--root", options.root, "Put every path of the system under this folder")
         ->type_name("DIR");
-    const std::map<std::string, LogLevel> levels{
-        {"debug", LogLevel::debug}, {"default", LogLevel::defaultLevel}, {"error", LogLevel::error}};
     app.add_option_function<std::string>(
-           "--log-level", [&](const std::string& level) { options.logLevel = levels.at(level); },
+           "--log-level", [&](const std::string& level) { options.logLevel = *logLevelFromName(level); },
            "Least level that is logged")
         ->type_name("LEVEL")
         ->check(CLI::IsMember({"debug", "default", "error"}));

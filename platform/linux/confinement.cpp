@@ -88,11 +88,11 @@ ConfinementProbe::ConfinementProbe()
     const FileDescriptor one(::open("/proc/1", O_PATH | O_DIRECTORY | O_CLOEXEC));
     const FileDescriptor self(::open("/proc/self", O_PATH | O_DIRECTORY | O_CLOEXEC));
     host_ = viewOf(one.get());
-    isProcessOne_ = host_.isWhole();
-    if (!isProcessOne_) {
+    const bool isProcessOne = host_.isWhole();
+    if (!isProcessOne) {
         host_ = viewOf(self.get());
     }
-    hostProcessNamespace_ = inodeAt(isProcessOne_ ? one.get() : self.get(), "ns/pid");
+    hostProcessNamespace_ = inodeAt(isProcessOne ? one.get() : self.get(), "ns/pid");
     // Without a labelling LSM the file exists and reading it fails.
     const FileDescriptor label(::openat(self.get(), "attr/current", O_RDONLY | O_CLOEXEC));
     char first = 0;

@@ -24,8 +24,6 @@ public:
 
     /// The process namespace of the host.
     const std::optional<Inode>& hostProcessNamespace() const { return hostProcessNamespace_; }
-    /// True when the host was taken from process 1.
-    bool isComparedWithProcessOne() const { return isProcessOne_; }
 
 private:
     /// The namespaces and the root a process sees; members that cannot be read are null. Namespaces are told
@@ -45,7 +43,6 @@ private:
 
     View host_;
     std::optional<Inode> hostProcessNamespace_;
-    bool isProcessOne_ = false;
     bool hasLabels_ = false;
 };
 
