@@ -78,7 +78,7 @@ void addCommands(CLI::App& parser, Invocation& invocation)
 
 int runCommandLine(const std::vector<std::string>& words)
 {
-    CLI::App parser{"Fonts, what programs see of them, signed identities, sandboxes and the administration of typhond",
+    CLI::App parser{"Fonts, what programs see of them, signatures, sandboxes and administration",
                     "typhonctl"};
     Invocation invocation;
     parser
