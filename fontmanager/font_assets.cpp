@@ -22,12 +22,34 @@ namespace {
 constexpr mode_t directoryPermissions = 0755;
 constexpr std::size_t mostAssets = 1U << 16;
 constexpr std::size_t mostFiles = 4096;
+/// Of one synchronisation, when assets come all the time.
+constexpr unsigned mostRuns = 4;
 constexpr int directoryFlags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 const std::string fontAssets(font_directories::fontAssets);
 
 bool isAssetName(const std::string& name)
 {
     return !name.empty() && name.front() != '.' && name == visibleText(name);
+}
+
+/// To one that failed or is not whole.
+std::string objectionTo(const DirectoryListing& listing)
+{
+    return listing.error != 0 ? errorText(listing.error) : "it holds too many names";
+}
+
+/// A path that came and went, or went and came, stands where it was last.
+void addLater(RegistryChange& change, const RegistryChange& later)
+{
+    const auto move = [](std::vector<std::string>& to, std::vector<std::string>& from,
+                         const std::vector<std::string>& paths) {
+        const std::set<std::string> moved(paths.begin(), paths.end());
+        std::erase_if(from, [&](const auto& path) { return moved.contains(path); });
+        to.insert(to.end(), paths.begin(), paths.end());
+    };
+    move(change.available, change.gone, later.available);
+    move(change.gone, change.available, later.gone);
+    change.isRegistryChanged |= later.isRegistryChanged;
 }
 
 bool isDisabled(const PropertyList::Dictionary& entries, const std::string& path)
@@ -42,43 +64,61 @@ bool isDisabled(const PropertyList::Dictionary& entries, const std::string& path
 RegistryChangeOutcome FontAssets::synchronize()
 {
     const std::lock_guard lock(mutex_);
-    const FileDescriptor store(::open(root_.real(font_directories::assetStore).c_str(), directoryFlags));
-    if (!store && errno != ENOENT) {
-        return {.change = {}, .error = "cannot open the asset store: " + errorText(errno)};
-    }
-    if (auto error = makeDirectories(root_.real(fontAssets), directoryPermissions)) {
-        return {.change = {}, .error = std::move(error)};
-    }
-    const auto before = readFontRecord(root_, font_paths::registry);
-    Plan plan;
     RegistryChangeOutcome outcome;
-    if (store) {
-        const auto listing = listDirectory(store.get(), mostAssets);
-        if (listing.error != 0) {
-            return {.change = {}, .error = "cannot list the asset store: " + errorText(listing.error)};
-        }
-        for (const auto& asset : listing.directories) {
-            auto error = isAssetName(asset) ? planAsset(store.get(), asset, *before.asDictionary(), plan)
-                                            : std::nullopt;
-            if (error && !outcome.error) {
-                outcome.error = asset + ": " + *error;
-            }
-        }
+    unsigned runs = 0;
+    // What came meanwhile is taken in too: nobody else may ever say that it came, while nobody watches yet.
+    while (runs < mostRuns && synchronizeOnce(outcome)) {
+        ++runs;
     }
-    if (auto error = register_(plan, outcome.change)) {
-        return {.change = {}, .error = std::move(error)};
-    }
-    removeUnwanted(plan.wanted);
     return outcome;
 }
 
-/// An error is the disk's, and leaves out the rest of this asset only.
+/// Adds to the outcome. True when all went well and assets came or went meanwhile.
+bool FontAssets::synchronizeOnce(RegistryChangeOutcome& outcome)
+{
+    const FileDescriptor store(::open(root_.real(font_directories::assetStore).c_str(), directoryFlags));
+    if (!store && errno != ENOENT) {
+        outcome.error = "cannot open the asset store: " + errorText(errno);
+        return false;
+    }
+    const auto listing = store ? listDirectory(store.get(), mostAssets) : DirectoryListing{};
+    if (listing.error != 0 || listing.isCut) {
+        outcome.error = "cannot list the asset store: " + objectionTo(listing);
+        return false;
+    }
+    if (auto error = makeDirectories(root_.real(fontAssets), directoryPermissions)) {
+        outcome.error = std::move(error);
+        return false;
+    }
+    const auto before = readFontRecord(root_, font_paths::registry);
+    Plan plan;
+    for (const auto& asset : listing.directories) {
+        auto error =
+            isAssetName(asset) ? planAsset(store.get(), asset, *before.asDictionary(), plan) : std::nullopt;
+        if (error) {
+            keepAsItIs(asset, *before.asDictionary(), plan);
+            outcome.error = outcome.error.value_or(asset + ": " + *error);
+        }
+    }
+    RegistryChange change;
+    if (auto error = register_(plan, change)) {
+        outcome.error = std::move(error);
+        return false;
+    }
+    removeUnwanted(plan.wanted);
+    addLater(outcome.change, change);
+    struct stat status {};
+    return !outcome.error && ::fstat(store.get(), &status) == 0 && FileIdentity(status) != listing.identity;
+}
+
+/// An error is the disk's, and leaves the rest of this asset as it is.
 std::optional<std::string> FontAssets::planAsset(int store, const std::string& asset,
                                                  const PropertyList::Dictionary& before, Plan& plan)
 {
     const FileDescriptor data(::openat(store, (asset + "/AssetData").c_str(), directoryFlags));
     if (!data) {
-        return std::nullopt;
+        const bool isNoAsset = errno == ENOENT || errno == ENOTDIR || errno == ELOOP;
+        return isNoAsset ? std::nullopt : std::optional(errorText(errno));
     }
     const auto place = fontAssets + asset;
     if (auto error = makeDirectories(root_.real(place), directoryPermissions)) {
@@ -88,8 +128,12 @@ std::optional<std::string> FontAssets::planAsset(int store, const std::string& a
     if (!directory) {
         return errorText(errno);
     }
+    const auto listing = listDirectory(data.get(), mostFiles);
+    if (listing.error != 0 || listing.isCut) {
+        return objectionTo(listing);
+    }
     bool hasPlaced = false;
-    for (const auto& name : listDirectory(data.get(), mostFiles).files) {
+    for (const auto& name : listing.files) {
         const auto path = place + "/" + name;
         if (font_paths::objectionToFontFileName(name)) {
             continue;
@@ -117,6 +161,16 @@ std::optional<std::string> FontAssets::planAsset(int store, const std::string& a
             {path, {names.familyNames->begin(), names.familyNames->end()}, isDisabled(before, path)});
     }
     return hasPlaced ? flushDirectory(root_.real(place)) : std::nullopt;
+}
+
+void FontAssets::keepAsItIs(const std::string& asset, const PropertyList::Dictionary& before, Plan& plan)
+{
+    const auto directory = fontAssets + asset + "/";
+    for (auto at = before.lower_bound(directory); at != before.end() && at->first.starts_with(directory);
+         ++at) {
+        plan.kept.insert(at->first);
+        plan.wanted[asset].insert(at->first.substr(directory.size()));
+    }
 }
 
 std::optional<std::string> FontAssets::register_(const Plan& plan, RegistryChange& change)

@@ -25,7 +25,8 @@ public:
 
     /// Brings directories and registry in step with the store: new files take their places first, then the
     /// registry changes, then files that are no longer wanted go; killed in between, the next run completes
-    /// it. A file that is no good font is logged and left out, and keeps nothing else out.
+    /// it. A file that is no good font is logged and left out, and keeps nothing else out; an asset that the
+    /// disk fails for stays as it is, and is tried again by the next run.
     RegistryChangeOutcome synchronize();
 
 private:
@@ -39,8 +40,10 @@ private:
         Files wanted;
     };
 
+    bool synchronizeOnce(RegistryChangeOutcome& outcome);
     std::optional<std::string> planAsset(int store, const std::string& asset,
                                          const PropertyList::Dictionary& before, Plan& plan);
+    static void keepAsItIs(const std::string& asset, const PropertyList::Dictionary& before, Plan& plan);
     std::optional<std::string> register_(const Plan& plan, RegistryChange& change);
     void removeUnwanted(const Files& wanted);
 

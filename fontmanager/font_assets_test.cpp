@@ -1,16 +1,23 @@
+#include "fontmanager/font_asset_files.h"
 #include "fontmanager/font_assets.h"
 #include "fontmanager/font_names.h"
 #include "fontmanager/font_paths.h"
 #include "fontmanager/profile_fonts.h"
 #include "fontmanager/test_fonts.h"
+#include "platform/linux/file_descriptor.h"
 #include "platform/linux/linux_log.h"
 #include "platform/linux/scratch_directory.h"
 
 #include <filesystem>
+#include <functional>
+#include <utility>
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/mman.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 namespace typhon {
 namespace {
@@ -49,9 +56,12 @@ protected:
     RootDirectory root{scratch.path()};
     LinuxLog log{LogLevel::error, LinuxLog::Destination::descriptor, -1};
     unsigned readings = 0;
+    /// Happens during the next reading of a font.
+    std::function<void()> meanwhile = [] {};
     FontAssets assets{root,
                       [this](int file) {
                           ++readings;
+                          std::exchange(meanwhile, [] {})();
                           return readFontNames(file);
                       },
                       log};
@@ -77,6 +87,25 @@ TEST_F(FontAssetsTest, WhatIsInStepIsNotReadAgain)
     install("b.asset", "b.ttf");
     synchronize();
     EXPECT_EQ(readings, 1U);
+}
+
+TEST_F(FontAssetsTest, WhatComesMeanwhileIsTakenInToo)
+{
+    install("b.asset", "b.ttf");
+    meanwhile = [&] { install("a.asset", "a.ttf"); };
+    EXPECT_THAT(synchronize().available, ElementsAre(own + "b.asset/b.ttf", own + "a.asset/a.ttf"));
+    EXPECT_THAT(registered(), ElementsAre(own + "a.asset/a.ttf", own + "b.asset/b.ttf"));
+}
+
+TEST_F(FontAssetsTest, WhatGoesMeanwhileIsReportedAsGoneOnly)
+{
+    install("a.asset", "a.ttf");
+    install("b.asset", "b.ttf");
+    meanwhile = [&] { fs::remove_all(scratch.real(store + "a.asset")); };
+    const auto change = synchronize();
+    EXPECT_THAT(change.available, ElementsAre(own + "b.asset/b.ttf"));
+    EXPECT_THAT(change.gone, ElementsAre(own + "a.asset/a.ttf"));
+    EXPECT_THAT(registered(), ElementsAre(own + "b.asset/b.ttf"));
 }
 
 TEST_F(FontAssetsTest, ABadFontKeepsOutNothingElse)
@@ -129,6 +158,46 @@ TEST_F(FontAssetsTest, OtherFontsOfTheRegistryAreLeftAlone)
     fs::remove_all(scratch.real(store + "a.asset"));
     synchronize();
     EXPECT_THAT(registered(), ElementsAre(other));
+}
+
+TEST_F(FontAssetsTest, AnAssetThatTheDiskFailsForKeepsItsFontsAndKeepsOutNoOther)
+{
+    std::vector<std::string> expected;
+    for (const char* name : {"a.ttf", "b.ttf", "c.ttf", "x.ttf", "y.ttf", "z.ttf"}) {
+        install("a.asset", name);
+        expected.push_back(own + "a.asset/" + name);
+    }
+    synchronize();
+    install("a.asset", "new.ttf");
+    install("b.asset", "b.ttf", test_fonts::serif);
+    // Nothing can take its place.
+    scratch.writeFile(own + "a.asset/new.ttf/in-the-way", "");
+    const auto outcome = assets.synchronize();
+    EXPECT_THAT(outcome.error.value_or(""), testing::HasSubstr("a.asset"));
+    EXPECT_THAT(outcome.change.gone, IsEmpty());
+    expected.push_back(own + "b.asset/b.ttf");
+    EXPECT_EQ(registered(), expected);
+    for (const auto& path : expected) {
+        EXPECT_TRUE(isThere(path)) << path;
+    }
+    fs::remove_all(scratch.real(own + "a.asset/new.ttf"));
+    EXPECT_THAT(synchronize().available, ElementsAre(own + "a.asset/new.ttf"));
+}
+
+TEST_F(FontAssetsTest, AFontThatCannotBeLinkedIsCopiedAndKnownAgain)
+{
+    const auto contents = test_fonts::contentsOf(test_fonts::sans);
+    // On a file system of its own.
+    const FileDescriptor from(::memfd_create("font", MFD_CLOEXEC));
+    ASSERT_EQ(::write(from.get(), contents.data(), contents.size()), static_cast<ssize_t>(contents.size()));
+    struct stat status {};
+    ASSERT_EQ(::fstat(from.get(), &status), 0);
+    const FileDescriptor directory(::open(scratch.path().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    ASSERT_EQ(placeAssetFile(from.get(), status, directory.get(), "a.ttf"), std::nullopt);
+    EXPECT_EQ(scratch.readFile("/a.ttf"), contents);
+    EXPECT_TRUE(isPlacedAssetFile(status, directory.get(), "a.ttf"));
+    scratch.writeFile("/a.ttf", contents + "changed");
+    EXPECT_FALSE(isPlacedAssetFile(status, directory.get(), "a.ttf"));
 }
 
 TEST_F(FontAssetsTest, LinksThatLeadOutOfTheStoreAreNotFollowed)

@@ -21,7 +21,7 @@ FontManagerError errorOf(const ClientResult<T>& result)
 }  // namespace
 
 LinuxUserFontManager::LinuxUserFontManager(RootDirectory root, Log& log, std::optional<std::string> helper)
-    : root_(std::move(root)), log_(log), helper_(std::move(helper))
+    : root_(std::move(root)), log_(log), helper_(std::move(helper)), registry_(root_, font_paths::registry)
 {}
 
 LinuxUserFontManager::~LinuxUserFontManager()
@@ -48,7 +48,7 @@ std::optional<std::string> LinuxUserFontManager::identifierFromDirectoryName(con
 
 PropertyList LinuxUserFontManager::userFontsInfo()
 {
-    return readFontRecord(root_, font_paths::registry);
+    return registry_.read();
 }
 
 PropertyList LinuxUserFontManager::profileFontsInfo()
@@ -116,15 +116,35 @@ void LinuxUserFontManager::synchronizeProfileFonts(std::function<void()> complet
 
 void LinuxUserFontManager::synchronizeFontAssets(std::function<void(bool)> completion)
 {
-    start([](FontRegistryClient& client) { return errorOf(client.synchronizeFontAssets()); },
-          [this, completion = std::move(completion)](const FontManagerError& error) {
-              if (error) {
-                  TYLog_Error(log_, "font assets were not synchronised: " + *error);
-              }
-              if (completion) {
-                  completion(!error);
-              }
-          });
+    {
+        const std::lock_guard lock(mutex_);
+        assetCompletions_.push_back(std::move(completion));
+        if (assetCompletions_.size() > 1) {
+            return;
+        }
+        enqueue([this] { runAssetSynchronization(); });
+    }
+    changed_.notify_one();
+}
+
+/// Whoever asks from now on wants to see what has changed since, and so gets another one.
+void LinuxUserFontManager::runAssetSynchronization()
+{
+    std::vector<std::function<void(bool)>> completions;
+    {
+        const std::lock_guard lock(mutex_);
+        completions.swap(assetCompletions_);
+    }
+    const auto error =
+        perform([](FontRegistryClient& client) { return errorOf(client.synchronizeFontAssets()); });
+    if (error) {
+        TYLog_Error(log_, "font assets were not synchronised: " + *error);
+    }
+    for (const auto& completion : completions) {
+        if (completion) {
+            completion(!error);
+        }
+    }
 }
 
 FontManagerError LinuxUserFontManager::perform(const Operation& operation) const
@@ -142,17 +162,23 @@ void LinuxUserFontManager::start(Operation operation, std::function<void(FontMan
 {
     {
         const std::lock_guard lock(mutex_);
-        pending_.emplace_back([this, operation = std::move(operation), completion = std::move(completion)] {
+        enqueue([this, operation = std::move(operation), completion = std::move(completion)] {
             auto error = perform(operation);
             if (completion) {
                 completion(std::move(error));
             }
         });
-        if (!worker_.joinable()) {
-            worker_ = std::thread([this] { work(); });
-        }
     }
     changed_.notify_one();
+}
+
+/// Under the mutex.
+void LinuxUserFontManager::enqueue(std::function<void()> work)
+{
+    pending_.push_back(std::move(work));
+    if (!worker_.joinable()) {
+        worker_ = std::thread([this] { this->work(); });
+    }
 }
 
 void LinuxUserFontManager::work()

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "fontmanager/kept_font_record.h"
 #include "platform/linux/root_directory.h"
 #include "platform/log.h"
 #include "platform/user_font_manager.h"
@@ -19,7 +20,9 @@ class FontRegistryClient;
 
 /// The font-registry library over the files of this machine and, for whatever changes them, its helper, which
 /// it starts where no service manager does. Operations run one after another, and their completions come in
-/// order. Waits, when destroyed, for those that are under way; so it is not destroyed by a completion.
+/// order; but synchronisations of font assets that are asked for while one waits to begin are that one, so
+/// that there are two of them at most, however many ask. Waits, when destroyed, for those that are under way;
+/// so it is not destroyed by a completion.
 class LinuxUserFontManager final : public TYUserFontManager {
 public:
     /// `log` outlives this. `helper` is the helper's executable; null for the one that is found.
@@ -43,17 +46,23 @@ private:
     /// An operation at the helper; null when it succeeded.
     using Operation = std::function<FontManagerError(FontRegistryClient&)>;
     void start(Operation operation, std::function<void(FontManagerError)> completion);
+    void enqueue(std::function<void()> work);
+    void runAssetSynchronization();
     FontManagerError perform(const Operation& operation) const;
     void work();
 
     const RootDirectory root_;
     Log& log_;
     const std::optional<std::string> helper_;
+    /// What changes it puts another file in its place.
+    KeptFontRecord registry_;
 
     std::mutex mutex_;
     std::condition_variable changed_;
     // Below: protected by the mutex.
     std::deque<std::function<void()>> pending_;
+    /// Of the synchronisation of font assets that is among these; empty when there is none.
+    std::vector<std::function<void(bool)>> assetCompletions_;
     bool isEnding_ = false;
     /// Runs operations and completions. Started with the first; last, so that all it uses is there.
     std::thread worker_;

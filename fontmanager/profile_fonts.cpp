@@ -59,15 +59,19 @@ RegistryChange difference(const PropertyList::Dictionary& before, const Property
 
 }  // namespace
 
-PropertyList readFontRecord(const RootDirectory& root, const char* logicalPath)
+PropertyList fontRecordIn(const OpenedFile& opened)
 {
-    const auto opened = openRegularFile(root.real(logicalPath));
     if (opened.error != 0) {
         return PropertyList::Dictionary{};
     }
     auto reading = readPropertyListFromDescriptor(opened.file.get());
     const bool isRecord = reading.value && reading.value->asDictionary() != nullptr;
     return isRecord ? std::move(*reading.value) : PropertyList(PropertyList::Dictionary{});
+}
+
+PropertyList readFontRecord(const RootDirectory& root, const char* logicalPath)
+{
+    return fontRecordIn(openRegularFile(root.real(logicalPath)));
 }
 
 PropertyList::Dictionary ProfileFonts::readFonts()

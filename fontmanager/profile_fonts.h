@@ -2,6 +2,7 @@
 
 #include "fontmanager/font_registration.h"
 #include "fontmanager/font_store.h"
+#include "platform/linux/regular_file.h"
 #include "platform/linux/root_directory.h"
 #include "platform/log.h"
 
@@ -34,5 +35,8 @@ private:
 
 /// A property list of entries by path as it stands on disk; empty when it cannot be read.
 PropertyList readFontRecord(const RootDirectory& root, const char* logicalPath);
+
+/// The same of a file that was opened, or could not be.
+PropertyList fontRecordIn(const OpenedFile& opened);
 
 }  // namespace typhon

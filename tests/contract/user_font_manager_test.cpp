@@ -10,6 +10,7 @@
 #include "platform/simulated/simulated_user_font_manager.h"
 
 #include <array>
+#include <atomic>
 #include <chrono>
 #include <functional>
 #include <future>
@@ -270,6 +271,58 @@ TEST_P(UserFontManagerChanges, ACompletionMayBeLeftOut)
     EXPECT_EQ(enableOrDisable({fileUrlFromPath(otherFontOfA)}, true), std::nullopt);
     EXPECT_TRUE(isDisabled(fontOfA));
     EXPECT_EQ(subject->manager().userFontsInfo().find(fontOfB), nullptr);
+}
+
+TEST_P(UserFontManagerContract, SynchronizingAssetsCompletesForEachThatAsks)
+{
+    std::array<std::promise<bool>, 5> promises;
+    for (auto& promise : promises) {
+        subject->manager().synchronizeFontAssets([&](bool success) { promise.set_value(success); });
+    }
+    subject->manager().synchronizeFontAssets({});
+    subject->proceed();
+    for (auto& promise : promises) {
+        auto outcome = promise.get_future();
+        ASSERT_EQ(outcome.wait_for(30s), std::future_status::ready);
+        EXPECT_TRUE(outcome.get());
+    }
+}
+
+TEST(LinuxUserFontManagerTest, AssetSynchronisationsThatAreAskedForDuringOneAreOneMore)
+{
+    constexpr unsigned others = 50;
+    const ScratchDirectory scratch;
+    LinuxLog log{LogLevel::error, LinuxLog::Destination::descriptor, -1};
+    scratch.writeFile("/private/var/Cargon/AssetsV2/com_vorlan_Cargon_Font7/a.asset/AssetData/bad.ttf", "");
+    std::promise<void> began;
+    std::promise<void> gate;
+    std::atomic<unsigned> readings = 0;
+    // A bad font is read by every synchronisation, and by none twice.
+    test_service::RunningService helper(RootDirectory(scratch.path()),
+                                        [&, isOpen = gate.get_future().share()](int) {
+                                            if (readings++ == 0) {
+                                                began.set_value();
+                                            }
+                                            isOpen.wait();
+                                            return FontNamesReading{.familyNames = {}, .error = "no font"};
+                                        });
+    LinuxUserFontManager manager(RootDirectory(scratch.path()), log, scratch.real("/no-helper"));
+    std::promise<void> last;
+    const auto count = [&, completed = std::make_shared<unsigned>(0)](bool success) {
+        EXPECT_TRUE(success);
+        if (++*completed == others + 1) {
+            last.set_value();
+        }
+    };
+    manager.synchronizeFontAssets(count);
+    const bool hasBegun = began.get_future().wait_for(30s) == std::future_status::ready;
+    for (unsigned other = 0; other < others; ++other) {
+        manager.synchronizeFontAssets(count);
+    }
+    gate.set_value();
+    ASSERT_TRUE(hasBegun);
+    ASSERT_EQ(last.get_future().wait_for(30s), std::future_status::ready);
+    EXPECT_EQ(readings, 2U) << "what is asked for in the middle of one may be too late for it";
 }
 
 TEST(LinuxUserFontManagerTest, WithoutTheHelperOperationsEndWithAnError)
