@@ -26,7 +26,7 @@ constexpr Part parts[] = {
     {"idle", measureIdleConnections},  {"loading", measureLoading},     {"start", measureStart},
     {"ledger", measureLedger},         {"names", measureNames},         {"shares", measureShares},
     {"deletion", measureDeletion},     {"broadcast", measureBroadcast}, {"request", measureRequest},
-    {"installing", measureInstalling},
+    {"installing", measureInstalling}, {"assets", measureAssets},       {"watch", measureWatch},
 };
 
 std::vector<std::string> names()

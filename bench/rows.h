@@ -19,5 +19,7 @@ void measureRequest(Report& report);
 void measureNames(Report& report);
 void measureShares(Report& report);
 void measureDeletion(Report& report);
+void measureAssets(Report& report);
+void measureWatch(Report& report);
 
 }  // namespace typhon::bench
