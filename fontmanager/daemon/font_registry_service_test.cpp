@@ -120,6 +120,12 @@ TEST_F(FontRegistryServiceTest, ApplicationsThatAreNoProvidersAreDenied)
     EXPECT_EQ(registry(), PropertyList());
 }
 
+TEST_F(FontRegistryServiceTest, AnAdministratorWithoutAnIdentifierHasToSayWhoseFontsItMeans)
+{
+    EXPECT_EQ(errorName(client().registerFonts("", {test_fonts::sans}, true)), ipc_errors::invalidArguments);
+    EXPECT_EQ(errorName(client().unregisterAllFonts("")), ipc_errors::invalidArguments);
+}
+
 TEST_F(FontRegistryServiceTest, ACallerThatCannotBeIdentifiedIsToldSo)
 {
     running.identities.failWith({ipc_errors::accessDenied, "start the daemon"});

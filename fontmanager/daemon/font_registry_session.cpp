@@ -37,6 +37,12 @@ IpcError denied(std::string message)
     return {ipc_errors::accessDenied, std::move(message)};
 }
 
+IpcError nobodysFonts()
+{
+    return {ipc_errors::invalidArguments,
+            "whose fonts? The calling program has no identifier of its own, so it has to give one"};
+}
+
 struct Paths {
     std::vector<std::string> paths;
     std::optional<IpcError> error;
@@ -141,10 +147,13 @@ Task<void> FontRegistrySession::beginRegistration(Self self, AuditToken caller, 
     }
     Task<Permission> asking = permissionOf(self, caller);
     const auto permission = co_await std::move(asking);
-    auto identifier = text(call, 0);
-    identifier = identifier.empty() ? permission.identifier : identifier;
+    const auto identifier = permission.meant(text(call, 0));
     if (permission.error || !permission.covers(identifier)) {
         call->fail(permission.error.value_or(denied("a font provider installs fonts for itself only")));
+        co_return;
+    }
+    if (identifier.empty()) {
+        call->fail(nobodysFonts());
         co_return;
     }
     auto beginning = self->service_->parts().store.begin(identifier, value(call, 1).isTrue());
@@ -239,10 +248,13 @@ Task<void> FontRegistrySession::unregisterAll(Self self, AuditToken caller, Call
 {
     Task<Permission> asking = permissionOf(self, caller);
     const auto permission = co_await std::move(asking);
-    auto identifier = text(call, 0);
-    identifier = identifier.empty() ? permission.identifier : identifier;
+    const auto identifier = permission.meant(text(call, 0));
     if (permission.error || !permission.covers(identifier)) {
         call->fail(permission.error.value_or(denied("a font provider removes its own fonts only")));
+        co_return;
+    }
+    if (identifier.empty()) {
+        call->fail(nobodysFonts());
         co_return;
     }
     std::function<RegistryChangeOutcome(FontStore&)> work = [identifier](FontStore& store) {

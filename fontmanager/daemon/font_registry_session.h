@@ -34,6 +34,8 @@ private:
         std::string identifier;
         std::optional<IpcError> error;
 
+        /// Whose fonts a call is about: empty in the call means the caller's own.
+        std::string meant(std::string provider) const { return provider.empty() ? identifier : provider; }
         bool covers(const std::string& provider) const { return everybody || identifier == provider; }
         bool coversFile(const std::string& path) const;
     };
