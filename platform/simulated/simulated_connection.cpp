@@ -101,16 +101,22 @@ void SimulatedConnection::end()
     inbox_.clear();
     failPendingCalls();
     std::erase(machine_->resumedConnections, self);
-    post(runInvalidation(self));
+    // Also when a device without power never runs the handler, which would then hold the connection for ever.
+    std::shared_ptr<void> dropping(nullptr, [self](void*) {
+        self->invalidationHandler_ = nullptr;
+        self->dropHandlers();
+    });
+    post(runInvalidation(self, std::move(dropping)));
 }
 
-Task<void> SimulatedConnection::runInvalidation(std::shared_ptr<SimulatedConnection> self)
+Task<void> SimulatedConnection::runInvalidation(std::shared_ptr<SimulatedConnection> self,
+                                                std::shared_ptr<void> dropping)
 {
     if (auto handler = std::exchange(self->invalidationHandler_, nullptr)) {
         Task<void> running = connection_work::runCallback(self->machine_->log, handler);
         co_await std::move(running);
     }
-    self->dropHandlers();
+    dropping.reset();
 }
 
 void SimulatedConnection::dropHandlers()

@@ -93,7 +93,8 @@ private:
                                   std::string member, Arguments arguments, std::int64_t timeout);
     static Task<void> handleUnlessEnded(std::shared_ptr<SimulatedConnection> self,
                                         std::shared_ptr<IncomingCall> call);
-    static Task<void> runInvalidation(std::shared_ptr<SimulatedConnection> self);
+    static Task<void> runInvalidation(std::shared_ptr<SimulatedConnection> self,
+                                        std::shared_ptr<void> dropping);
 
     const std::shared_ptr<SimulatedMachine> machine_;
     const Origin origin_;

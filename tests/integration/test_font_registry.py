@@ -114,8 +114,8 @@ class FontRegistry(unittest.TestCase):
 
     def test_a_call_fails_when_the_helper_is_killed_during_it(self):
         pid = self.system.helper_pid()
-        # The daemon's own call, of its start.
-        eventually(lambda: not self.is_waiting_for(pid))
+        # The daemon has calls of its own for the helper, and must not be taken for the one below.
+        eventually(lambda: self.stops_the_daemon_between_calls_of(pid))
         os.kill(pid, signal.SIGSTOP)
         with concurrent.futures.ThreadPoolExecutor(1) as pool:
             call = pool.submit(self.system.ctl, "fonts", "install", "--identifier", "org.example.a", SANS,
@@ -123,10 +123,19 @@ class FontRegistry(unittest.TestCase):
             # It connects to the stopped helper's socket and waits; killed earlier it would start another one.
             eventually(lambda: self.is_waiting_for(pid) or call.done())
             self.system.kill_helper()
+            self.system.daemon.process.send_signal(signal.SIGCONT)
             done = call.result()
         self.assertEqual(done.returncode, 1)
         self.assertIn("ended during the call", done.stderr.decode())
         self.assertEqual(registry_of(self.system), {})
+
+    def stops_the_daemon_between_calls_of(self, helper):
+        daemon = self.system.daemon.process
+        daemon.send_signal(signal.SIGSTOP)
+        is_between = not self.is_waiting_for(helper)
+        if not is_between:
+            daemon.send_signal(signal.SIGCONT)
+        return is_between
 
     def is_waiting_for(self, helper):
         """True when a connection waits to be accepted, or to be answered, by the stopped helper."""

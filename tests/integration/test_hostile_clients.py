@@ -16,10 +16,12 @@ HERE = pathlib.Path(__file__).parent
 CONNECTIONS_OF_A_PROCESS = 256
 # As docs/ipc.md states them.
 MOST_THREADS = 24
-MOST_GROWTH = 256 << 20
-LEFT_BEHIND = 32 << 20
+# What a sanitizer adds to every allocation, and keeps of freed ones, is not the daemon's.
+INSTRUMENTED = int(os.environ.get("TYPHON_MEMORY_FACTOR", "1"))
+MOST_GROWTH = INSTRUMENTED * 256 << 20
+LEFT_BEHIND = 32 << 20 if INSTRUMENTED == 1 else MOST_GROWTH
 IDLE_CONNECTIONS = int(os.environ.get("TYPHON_IDLE_CONNECTIONS", "500"))
-IDLE_CONNECTION_MEMORY = 16 << 10
+IDLE_CONNECTION_MEMORY = INSTRUMENTED * 16 << 10
 NEVER_ANSWERED_CALLS = int(os.environ.get("TYPHON_NEVER_ANSWERED_CALLS", "32000"))
 CHECK_INS_AT_ONCE = 1000
 FONTS = 2000
