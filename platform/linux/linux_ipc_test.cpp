@@ -207,6 +207,7 @@ TEST(LinuxIpc, ASocketLeftBehindIsReplacedALiveOneIsNot)
     ForeignClient client(service.path());
     EXPECT_TRUE(client.isAlive());
 
+    refused->invalidate();
     service.listener->invalidate();
     EXPECT_NE(::access(service.path().c_str(), F_OK), 0);
     const auto stale = listenAt(service.root.real("/run/typhon"), testedService);
