@@ -2,12 +2,15 @@
 
 namespace typhon {
 
-void NotificationCenter::add(const void* observer, std::string name, Delivery delivery)
+void NotificationCenter::add(const std::shared_ptr<const void>& observer, std::string name, Delivery delivery)
 {
     const std::lock_guard lock(mutex_);
     auto& observers = byName_[std::move(name)];
-    if (observers.places.try_emplace(observer, count_).second) {
-        observers.deliveries.emplace(count_++, std::move(delivery));
+    auto& place = observers.places[observer.get()];
+    if (place.observer.expired()) {
+        observers.deliveries.erase(place.number);
+        place = {++count_, observer};
+        observers.deliveries.emplace(place.number, std::move(delivery));
     }
 }
 
@@ -17,7 +20,7 @@ void NotificationCenter::removeObserver(const void* observer)
     for (auto& [name, observers] : byName_) {
         const auto place = observers.places.find(observer);
         if (place != observers.places.end()) {
-            observers.deliveries.erase(place->second);
+            observers.deliveries.erase(place->second.number);
             observers.places.erase(place);
         }
     }

@@ -27,7 +27,7 @@ public:
                      void (Observer::*operation)(const PropertyList&))
     {
         const std::weak_ptr<Observer> weak = observer;
-        add(observer.get(), std::move(name), [weak, operation](const PropertyList& payload) {
+        add(observer, std::move(name), [weak, operation](const PropertyList& payload) {
             if (const auto present = weak.lock()) {
                 ((*present).*operation)(payload);
             }
@@ -46,13 +46,18 @@ public:
 
 private:
     using Delivery = std::function<void(const PropertyList&)>;
+    struct Place {
+        std::uint64_t number = 0;
+        /// Tells one that is gone from another one at the same address.
+        std::weak_ptr<const void> observer;
+    };
     /// The observers of one name, by the order in which they came.
     struct Observers {
         std::map<std::uint64_t, Delivery> deliveries;
-        std::unordered_map<const void*, std::uint64_t> places;
+        std::unordered_map<const void*, Place> places;
     };
 
-    void add(const void* observer, std::string name, Delivery delivery);
+    void add(const std::shared_ptr<const void>& observer, std::string name, Delivery delivery);
     std::vector<Delivery> deliveriesFor(std::string_view name) const;
 
     mutable std::mutex mutex_;

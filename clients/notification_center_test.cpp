@@ -1,5 +1,9 @@
 #include "clients/notification_center.h"
 
+#include <array>
+#include <cstddef>
+#include <new>
+
 #include <gtest/gtest.h>
 
 namespace typhon {
@@ -53,6 +57,21 @@ TEST_F(NotificationCenterTest, AnObserverThatIsGoneIsSkippedAndNotKeptAlive)
     EXPECT_TRUE(weak.expired());
     center.post("fontChanged", "now");
     EXPECT_TRUE(heard.empty());
+}
+
+TEST_F(NotificationCenterTest, AnObserverInTheMemoryOfOneThatIsGoneIsAnotherOne)
+{
+    alignas(Observer) std::array<std::byte, sizeof(Observer)> memory{};
+    const auto make = [&](const std::string& name) {
+        return std::shared_ptr<Observer>(new (memory.data()) Observer(heard, name),
+                                         [](Observer* observer) { observer->~Observer(); });
+    };
+    center.addObserver(make("first"), "fontChanged", &Observer::receive);
+    const auto second = make("second");
+    center.addObserver(second, "fontChanged", &Observer::receive);
+    center.post("fontChanged", "now");
+    EXPECT_EQ(heard, std::vector<std::string>{"second now"});
+    EXPECT_EQ(center.observerCount("fontChanged"), 1U);
 }
 
 TEST_F(NotificationCenterTest, ARemovedObserverHearsNothing)
