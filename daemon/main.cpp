@@ -76,7 +76,7 @@ struct LinuxServices {
     LinuxFileSystem fileSystem{root};
     LinuxApplicationRegistry applicationRegistry{root, log};
     LinuxUserFontManager userFontManager{root, log};
-    LinuxAnalytics analytics{root, log};
+    LinuxAnalytics analytics{root, log, queues};
     LinuxNotifications notifications{pool, queues, log, root};
     LinuxAssetService assetService{
         pool,

@@ -17,10 +17,11 @@ std::optional<PropertyList> issueExtensionData(Sandbox& sandbox, const AuditToke
     return data;
 }
 
+// Entries mostly come in the order of their paths, so each belongs at the end.
 void EntrySharing::add(const std::string& path, const PropertyList& entry, bool noGrant)
 {
     if (isTrusted_ || noGrant || path.starts_with(font_directories::assetStore)) {
-        shared_.insert_or_assign(path, withoutDisabled(entry));
+        shared_.insert_or_assign(shared_.end(), path, withoutDisabled(entry));
         return;
     }
     // Intended: a confined client is not even told of a file that it can already read by itself.
@@ -31,7 +32,7 @@ void EntrySharing::add(const std::string& path, const PropertyList& entry, bool 
     if (auto data = issueExtensionData(sandbox_, token_, path)) {
         shared.insert_or_assign("data", *std::move(data));
     }
-    shared_.insert_or_assign(path, std::move(shared));
+    shared_.insert_or_assign(shared_.end(), path, std::move(shared));
 }
 
 }  // namespace typhon

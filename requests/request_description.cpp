@@ -24,7 +24,9 @@ void describeNames(const PropertyList& request, std::size_t longest, std::string
 
 std::string descriptionOf(const PropertyList::Array& requests, std::size_t longest)
 {
-    std::string text = "(";
+    std::string text;
+    text.reserve(longest);
+    text += '(';
     for (const auto& request : requests) {
         text += text.size() == 1 ? "{ " : ", { ";
         describeNames(request, longest, text);

@@ -1,11 +1,12 @@
 #include "platform/linux/linux_analytics.h"
 
 #include "platform/linux/file_descriptor.h"
-#include "platform/linux/journal_event.h"
 
+#include <chrono>
 #include <cstddef>
 #include <cstring>
 #include <string_view>
+#include <utility>
 
 #include <fcntl.h>
 #include <sys/socket.h>
@@ -14,10 +15,16 @@
 
 // The journal's socket takes datagrams of lines. It is written to directly rather than through libsystemd,
 // which knows one socket only and does not say whether anybody reads it.
+//
+// Building and writing an event takes a good part of the time that a request for fonts takes altogether, and
+// waking another thread for it would take the processor from the one that is about to answer. So a timer has
+// it done.
 
 namespace typhon {
 
 namespace {
+
+constexpr std::chrono::milliseconds aMoment(10);
 
 bool isThere(const std::string& path)
 {
@@ -46,17 +53,42 @@ const std::string& bootIdentifier()
 
 }  // namespace
 
-LinuxAnalytics::LinuxAnalytics(const RootDirectory& root, Log& log, std::string socket)
+LinuxAnalytics::LinuxAnalytics(const RootDirectory& root, Log& log, WorkQueues& queues, std::string socket)
     : log_(log), isScratch_(root.isScratch()),
-      destination_(root.isScratch() ? root.real(eventsPath) : std::move(socket))
+      destination_(root.isScratch() ? root.real(eventsPath) : std::move(socket)),
+      queue_(queues.createSerialQueue("com.vorlan.typhond.analytics")),
+      timer_(queues.createTimer(*queue_, [this] { collect(); }))
 {}
 
 void LinuxAnalytics::sendEventLazily(std::string name, std::function<PropertyList()> builder)
 {
-    if (!isCollecting()) {
-        return;
+    bool isFirst = false;
+    {
+        const std::lock_guard lock(mutex_);
+        isFirst = offers_.empty();
+        offers_.push_back({std::move(name), std::move(builder)});
     }
-    const auto fields = eventFields(name, builder());
+    if (isFirst) {
+        timer_->schedule(aMoment, aMoment);
+    }
+}
+
+void LinuxAnalytics::collect()
+{
+    std::vector<Offer> offers;
+    {
+        const std::lock_guard lock(mutex_);
+        offers.swap(offers_);
+    }
+    for (const auto& offer : offers) {
+        if (isCollecting()) {
+            write(eventFields(offer.name, offer.builder()));
+        }
+    }
+}
+
+void LinuxAnalytics::write(const EventFields& fields)
+{
     if (isScratch_) {
         // An empty line ends an exported entry.
         writeToFile("_BOOT_ID=" + bootIdentifier() + "\n" + eventText(fields) + "\n");
@@ -76,7 +108,7 @@ bool LinuxAnalytics::hasRoomInFile()
     if (::stat(destination_.c_str(), &status) != 0 || status.st_size < largestFile) {
         return true;
     }
-    if (!isFull_.exchange(true)) {
+    if (!std::exchange(isFull_, true)) {
         TYLog_Error(log_, destination_ + " is full: no more analytics events are kept");
     }
     return false;
@@ -84,7 +116,6 @@ bool LinuxAnalytics::hasRoomInFile()
 
 void LinuxAnalytics::writeToFile(const std::string& text)
 {
-    const std::lock_guard lock(writing_);
     const FileDescriptor file(
         ::open(destination_.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
     if (!file || ::write(file.get(), text.data(), text.size()) != static_cast<ssize_t>(text.size())) {

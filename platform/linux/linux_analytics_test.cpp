@@ -1,5 +1,6 @@
 #include "platform/linux/journal_event.h"
 #include "platform/linux/linux_analytics.h"
+#include "testing/manual_queues.h"
 #include "testing/scratch_folder.h"
 
 #include <array>
@@ -13,6 +14,7 @@
 namespace typhon {
 namespace {
 
+using testing::ManualQueues;
 using testing::RecordingLog;
 using testing::ScratchFolder;
 
@@ -45,6 +47,13 @@ private:
     FileDescriptor socket_;
 };
 
+class LinuxAnalyticsTest : public ::testing::Test {
+protected:
+    const ScratchFolder folder;
+    RecordingLog log;
+    ManualQueues queues;
+};
+
 TEST(EventFields, AreOneLineEachAndKeepTheirNames)
 {
     const auto text = eventText(eventFields("com.vorlan.font-privacy", payload()));
@@ -54,40 +63,57 @@ TEST(EventFields, AreOneLineEachAndKeepTheirNames)
               "TYPHON_EVENT_NAME=org.example.a\\nFORGED=1\n");
 }
 
-TEST(LinuxAnalytics, BuildsNothingWhereThereIsNoJournal)
+TEST_F(LinuxAnalyticsTest, BuildsNothingWhereThereIsNoJournal)
 {
-    const ScratchFolder folder;
-    RecordingLog log;
-    LinuxAnalytics analytics(RootDirectory(), log, folder.path + "/journal");
+    LinuxAnalytics analytics(RootDirectory(), log, queues, folder.path + "/journal");
     bool isBuilt = false;
     analytics.sendEventLazily("event", [&isBuilt] {
         isBuilt = true;
         return payload();
     });
+    queues.fire();
     EXPECT_FALSE(isBuilt);
     EXPECT_TRUE(log.lines().empty());
 }
 
-TEST(LinuxAnalytics, SendsEachEventToTheJournalAsOneEntry)
+TEST_F(LinuxAnalyticsTest, SendsEachEventToTheJournalAsOneEntry)
 {
-    const ScratchFolder folder;
-    RecordingLog log;
     Journal journal(folder.path + "/journal");
-    LinuxAnalytics analytics(RootDirectory(), log, folder.path + "/journal");
+    LinuxAnalytics analytics(RootDirectory(), log, queues, folder.path + "/journal");
     analytics.sendEventLazily("com.vorlan.font-privacy", payload);
+    EXPECT_EQ(journal.entry(), "");
+    queues.fire();
     EXPECT_EQ(journal.entry(),
               eventText(eventFields("com.vorlan.font-privacy", payload())) + "SYSLOG_IDENTIFIER=typhond\n");
     EXPECT_EQ(journal.entry(), "");
 }
 
-TEST(LinuxAnalytics, KeepsTheEventsOfAScratchSystemInItsFile)
+TEST_F(LinuxAnalyticsTest, BuildsNothingWhileItIsOfferedAnEventAndEachEventOnce)
 {
-    const ScratchFolder folder;
-    RecordingLog log;
+    LinuxAnalytics analytics(folder.root, log, queues);
+    int built = 0;
+    for (int count = 0; count < 3; ++count) {
+        analytics.sendEventLazily("event", [&built] {
+            ++built;
+            return payload();
+        });
+    }
+    EXPECT_EQ(built, 0);
+    EXPECT_GT(queues.armedFor, 0);
+    EXPECT_LT(queues.armedFor, 1);
+    queues.fire();
+    EXPECT_EQ(built, 3);
+    queues.fire();
+    EXPECT_EQ(built, 3);
+}
+
+TEST_F(LinuxAnalyticsTest, KeepsTheEventsOfAScratchSystemInItsFile)
+{
     std::filesystem::create_directories(folder.path + "/run/typhon");
-    LinuxAnalytics analytics(folder.root, log);
+    LinuxAnalytics analytics(folder.root, log, queues);
     analytics.sendEventLazily("one", payload);
     analytics.sendEventLazily("two", payload);
+    queues.fire();
     std::ifstream file(folder.root.real(LinuxAnalytics::eventsPath));
     const std::string text{std::istreambuf_iterator<char>(file), {}};
     EXPECT_EQ(text.rfind("_BOOT_ID=", 0), 0U);
@@ -96,19 +122,18 @@ TEST(LinuxAnalytics, KeepsTheEventsOfAScratchSystemInItsFile)
     EXPECT_NE(text.find("\nTYPHON_EVENT=two\n"), std::string::npos);
 }
 
-TEST(LinuxAnalytics, CollectsNothingMoreWhenTheFileIsFull)
+TEST_F(LinuxAnalyticsTest, CollectsNothingMoreWhenTheFileIsFull)
 {
-    const ScratchFolder folder;
-    RecordingLog log;
     const auto real = folder.write(LinuxAnalytics::eventsPath, "");
     std::filesystem::resize_file(real, LinuxAnalytics::largestFile);
-    LinuxAnalytics analytics(folder.root, log);
+    LinuxAnalytics analytics(folder.root, log, queues);
     bool isBuilt = false;
     for (int count = 0; count < 2; ++count) {
         analytics.sendEventLazily("event", [&isBuilt] {
             isBuilt = true;
             return payload();
         });
+        queues.fire();
     }
     EXPECT_FALSE(isBuilt);
     EXPECT_EQ(log.lines().size(), 1U);

@@ -2,6 +2,8 @@
 
 #include "platform/linux/unicode.h"
 
+#include <algorithm>
+
 #include <fmt/format.h>
 
 namespace typhon {
@@ -32,6 +34,9 @@ std::string escapeOf(char32_t control)
 
 std::string visibleText(std::string_view text, std::size_t limit)
 {
+    if (text.size() <= limit && std::ranges::all_of(text, [](char c) { return c >= 0x20 && c < 0x7F; })) {
+        return std::string(text);
+    }
     std::string visible;
     while (!text.empty()) {
         const auto [value, length] = firstCharacter(text);

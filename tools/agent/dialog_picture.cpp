@@ -46,6 +46,14 @@ std::string countText(const MissingFontsChoice& choice, std::size_t first, std::
                           : fmt::format("missing fonts {} to {} of {}", first + 1, first + shown, count);
 }
 
+const char* keysText(const MissingFontsChoice& choice, std::size_t shown)
+{
+    if (choice.hasChoice()) {
+        return "Up/Down: font  Left/Right: provider  Enter: done  Esc: none of them";
+    }
+    return shown < choice.rows().size() ? "Up/Down: font  Enter: done" : "Enter: done";
+}
+
 }  // namespace
 
 std::vector<std::string> dialogPicture(const MissingFontsChoice& choice, const TerminalSize& size,
@@ -60,15 +68,13 @@ std::vector<std::string> dialogPicture(const MissingFontsChoice& choice, const T
     std::vector<std::string> lines{displayText("A document needs fonts that are missing", columns),
                                    displayText(countText(choice, first, shown), columns), ""};
     for (auto index = first; index < first + shown; ++index) {
-        const bool isSelected = choice.selected() == index;
+        const bool isSelected =
+            choice.selected() == index && (choice.hasChoice() || shown < choice.rows().size());
         auto text = rowText(choice.rows()[index], isSelected, columns);
         lines.push_back(isSelected && marked ? "\x1B[7m" + text + "\x1B[0m" : text);
     }
     lines.emplace_back();
-    lines.push_back(displayText(choice.hasChoice()
-                                    ? "Up/Down: font  Left/Right: provider  Enter: done  Esc: none of them"
-                                    : "Enter: done",
-                                columns));
+    lines.push_back(displayText(keysText(choice, shown), columns));
     return lines;
 }
 

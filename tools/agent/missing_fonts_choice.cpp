@@ -45,35 +45,35 @@ MissingFontsChoice::MissingFontsChoice(const PropertyList& userInfo)
             continue;
         }
         rows_.push_back({*std::move(name), providersIn(record), textIn(record, "uniqueID"), std::nullopt});
-        if (!selected_ && rows_.back().isAvailable()) {
-            selected_ = rows_.size() - 1;
-        }
     }
+    const auto first = std::ranges::find_if(rows_, &Row::isAvailable);
+    if (!rows_.empty()) {
+        selected_ = first == rows_.end() ? 0 : static_cast<std::size_t>(first - rows_.begin());
+    }
+}
+
+bool MissingFontsChoice::hasChoice() const
+{
+    return std::ranges::any_of(rows_, &Row::isAvailable);
 }
 
 void MissingFontsChoice::selectNext()
 {
-    for (auto row = selected_.value_or(rows_.size()) + 1; row < rows_.size(); ++row) {
-        if (rows_[row].isAvailable()) {
-            selected_ = row;
-            return;
-        }
+    if (selected_ && *selected_ + 1 < rows_.size()) {
+        ++*selected_;
     }
 }
 
 void MissingFontsChoice::selectPrevious()
 {
-    for (auto row = selected_.value_or(0); row-- > 0;) {
-        if (rows_[row].isAvailable()) {
-            selected_ = row;
-            return;
-        }
+    if (selected_ && *selected_ > 0) {
+        --*selected_;
     }
 }
 
 void MissingFontsChoice::turn(std::size_t steps)
 {
-    if (!selected_) {
+    if (!selected_ || !rows_[*selected_].isAvailable()) {
         return;
     }
     auto& row = rows_[*selected_];

@@ -33,14 +33,16 @@ public:
     explicit MissingFontsChoice(const PropertyList& userInfo);
 
     const std::vector<Row>& rows() const { return rows_; }
-    /// The selected row; null when there is nothing to choose.
+    /// The selected row, at first the first that offers a choice; null when there are no rows.
     std::optional<std::size_t> selected() const { return selected_; }
-    bool hasChoice() const { return selected_.has_value(); }
+    /// Whether any row offers a choice.
+    bool hasChoice() const;
 
-    /// Selects the next or previous row that offers a choice, and stays where there is none.
+    /// Selects the next or previous row, whatever it offers, so that a face can show them all, and stays
+    /// where there is none.
     void selectNext();
     void selectPrevious();
-    /// Goes through what the selected row offers, in a circle: off, then each provider.
+    /// Goes through what the selected row offers, if it does, in a circle: off, then each provider.
     void nextProvider();
     void previousProvider();
     /// Chooses the first provider of every row.

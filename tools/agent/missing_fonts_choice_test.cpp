@@ -55,21 +55,24 @@ TEST(MissingFontsChoice, GoesThroughTheProvidersInACircle)
     EXPECT_EQ(choice.rows()[0].chosen, std::nullopt);
 }
 
-TEST(MissingFontsChoice, SelectsOnlyRowsThatOfferSomething)
+TEST(MissingFontsChoice, BeginsAtTheFirstRowThatOffersSomethingAndGoesOverAllOfThem)
 {
-    auto choice = choiceOf({row("A", {"one"}), row("No provider", {}), row("Unknown", {"x"}, false),
-                            row("B", {"one"}), row("Last", {}, false)});
+    auto choice = choiceOf({row("Unknown", {"x"}, false), row("A", {"one"}), row("No provider", {})});
+    EXPECT_EQ(choice.selected(), 1U);
+    choice.selectNext();
+    choice.selectNext();
+    EXPECT_EQ(choice.selected(), 2U);
+    choice.nextProvider();
+    choice.previousProvider();
+    EXPECT_TRUE(choice.answer().empty());
+    choice.selectPrevious();
+    choice.selectPrevious();
     choice.selectPrevious();
     EXPECT_EQ(choice.selected(), 0U);
-    choice.selectNext();
-    EXPECT_EQ(choice.selected(), 3U);
-    choice.selectNext();
-    EXPECT_EQ(choice.selected(), 3U);
-    choice.selectPrevious();
-    EXPECT_EQ(choice.selected(), 0U);
+    EXPECT_EQ(choiceOf({}).selected(), std::nullopt);
 }
 
-TEST(MissingFontsChoice, WithNothingToChooseEveryKeyDoesNothing)
+TEST(MissingFontsChoice, WithNothingToChooseEveryKeyChoosesNothing)
 {
     auto choice = choiceOf({row("Unknown", {}, false)});
     EXPECT_FALSE(choice.hasChoice());

@@ -93,6 +93,24 @@ TEST(DialogPicture, FitsIntoTerminalsOfEverySizeWithTheSelectedRowInSight)
     }
 }
 
+TEST(DialogPicture, FontsThatNobodyHasCanAllBeBroughtIntoSight)
+{
+    auto choice = choiceOf(1);
+    EXPECT_THAT(dialogPicture(choice, {80, 24}, false).back(), "Enter: done");
+    EXPECT_EQ(dialogPicture(choice, {80, 24}, false)[3].front(), ' ');
+    PropertyList::Array rows;
+    for (int number = 0; number < 50; ++number) {
+        rows.push_back(PropertyList::Dictionary{{"displayName", "Unknown " + std::to_string(number)}});
+    }
+    MissingFontsChoice unknown(PropertyList::Dictionary{{"fonts", std::move(rows)}});
+    EXPECT_THAT(dialogPicture(unknown, {80, 24}, false).back(), "Up/Down: font  Enter: done");
+    for (int number = 0; number < 50; ++number) {
+        EXPECT_THAT(dialogPicture(unknown, {80, 24}, false),
+                    ::testing::Contains(HasSubstr("> Unknown " + std::to_string(number))));
+        unknown.selectNext();
+    }
+}
+
 TEST(TerminalKeys, AreReadFromSequencesLettersAndPieces)
 {
     TerminalKeys keys;
