@@ -137,7 +137,8 @@ std::optional<std::string> FontRegistration::finish()
             return error;
         }
     }
-    for (const auto& staged : fonts_) {
+    for (; flushed_ < fonts_.size(); ++flushed_) {
+        const auto& staged = fonts_[flushed_];
         const FileDescriptor file(
             ::openat(directory(), staged.temporary.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC));
         if (!file || ::fdatasync(file.get()) != 0) {

@@ -55,7 +55,8 @@ public:
     std::optional<std::string> add(const std::string& name, int file);
 
     /// Waits until all names are read and all copies on the disk, where flushing all of them is cheaper than
-    /// each. Null, or why not, with the file's name. Before that the names in `fonts` are not there.
+    /// each. Null, or why not, with the file's name. Before that the names in `fonts` are not there. Calling it
+    /// again costs nothing.
     std::optional<std::string> finish();
 
     const std::vector<StagedFont>& fonts() const { return fonts_; }
@@ -82,6 +83,8 @@ private:
     std::vector<StagedFont> fonts_;
     std::set<std::string> names_;
     std::uint64_t bytes_ = 0;
+    /// How many of the fonts' copies are on the disk.
+    std::size_t flushed_ = 0;
     /// Those under way, in order. Last: they end before what they use.
     std::deque<Reading> readings_;
 };
