@@ -55,8 +55,8 @@ public:
     std::optional<std::string> add(const std::string& name, int file);
 
     /// Waits until all names are read and all copies on the disk, where flushing all of them is cheaper than
-    /// each. Null, or why not, with the file's name. Before that the names in `fonts` are not there. Calling it
-    /// again costs nothing.
+    /// each. Null, or why not, with the file's name. Before that the names in `fonts` are not there. Calling
+    /// it again costs nothing.
     std::optional<std::string> finish();
 
     const std::vector<StagedFont>& fonts() const { return fonts_; }
