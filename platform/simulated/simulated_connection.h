@@ -94,7 +94,7 @@ private:
     static Task<void> handleUnlessEnded(std::shared_ptr<SimulatedConnection> self,
                                         std::shared_ptr<IncomingCall> call);
     static Task<void> runInvalidation(std::shared_ptr<SimulatedConnection> self,
-                                        std::shared_ptr<void> dropping);
+                                      std::shared_ptr<void> dropping);
 
     const std::shared_ptr<SimulatedMachine> machine_;
     const Origin origin_;
