@@ -27,6 +27,7 @@ constexpr Part parts[] = {
     {"ledger", measureLedger},         {"names", measureNames},         {"shares", measureShares},
     {"deletion", measureDeletion},     {"broadcast", measureBroadcast}, {"request", measureRequest},
     {"installing", measureInstalling}, {"assets", measureAssets},       {"watch", measureWatch},
+    {"hostile", measureHostile},
 };
 
 std::vector<std::string> names()

@@ -21,5 +21,6 @@ void measureShares(Report& report);
 void measureDeletion(Report& report);
 void measureAssets(Report& report);
 void measureWatch(Report& report);
+void measureHostile(Report& report);
 
 }  // namespace typhon::bench

@@ -23,9 +23,6 @@ namespace typhon {
 namespace {
 
 const IpcError disconnectedError{ipc_errors::disconnected, "the connection is gone"};
-constexpr int messagesAtOnce = 16;
-
-constexpr const char* noMessage = "it sent something that is no message";
 
 std::string errorText(int error)
 {
@@ -41,24 +38,6 @@ std::unique_ptr<Handshake> newHandshake(BusLink::Role role)
     sd_id128_randomize(&identifier);
     std::array<char, SD_ID128_STRING_MAX> text;
     return std::make_unique<ServerHandshake>(sd_id128_to_string(identifier, text.data()));
-}
-
-/// What a peer has done wrong when its input ends like that; null when that is no offence.
-const char* offenceOf(MessageReception::Outcome outcome)
-{
-    using Outcome = MessageReception::Outcome;
-    switch (outcome) {
-    case Outcome::malformed:
-        return noMessage;
-    case Outcome::tooLarge:
-        return "its message is too large";
-    case Outcome::tooManyDescriptors:
-        return "its message has too many descriptors";
-    case Outcome::tooMuchHeld:
-        return "it left too many messages unfinished";
-    default:
-        return nullptr;
-    }
 }
 
 }  // namespace
@@ -77,20 +56,7 @@ BusLink::~BusLink()
     watch_.reset();
     context_->dispose(std::move(handshakeTimer_));
     context_->dispose(std::move(messageTimer_));
-}
-
-/// Runs `body` under the lock, then what it left for afterwards.
-template <class Body>
-void BusLink::locked(Body body)
-{
-    Afterwards afterwards;
-    {
-        const std::lock_guard lock(mutex_);
-        body(afterwards);
-    }
-    for (const auto& action : afterwards) {
-        action();
-    }
+    context_->dispose(std::move(restTimer_));
 }
 
 void BusLink::start()
@@ -103,7 +69,12 @@ void BusLink::start()
         handshake_ = newHandshake(role_);
         startTimer(handshakeTimer_, context_->limits.handshake, "it did not finish the handshake in time");
         watch(socket_.get());
-        proceedWithHandshake(afterwards);
+        const auto pause = context_->pace.restAfterConnecting(peer, std::chrono::steady_clock::now());
+        if (pause > std::chrono::nanoseconds::zero()) {
+            rest(pause);
+        } else {
+            proceedWithHandshake(afterwards);
+        }
     });
 }
 
@@ -121,43 +92,13 @@ void BusLink::close()
     locked([&](Afterwards& afterwards) { end(afterwards, false); });
 }
 
-void BusLink::handleEvents(std::uint32_t events)
-{
-    // What arrives meanwhile is not announced to another thread, which could do no more than wait for this
-    // one: it is read when this one is done, up to the number of messages after which others get their turn.
-    bool hasRead = true;
-    for (int count = 0; hasRead && count < messagesAtOnce; ++count) {
-        locked([&](Afterwards& afterwards) { hasRead = handleInput(std::exchange(events, 0), afterwards); });
-    }
-    const std::lock_guard lock(mutex_);
-    if (!ended_ && ready_) {
-        arm();
-    }
-}
-
-/// True when there may be more to read.
-bool BusLink::handleInput(std::uint32_t events, Afterwards& afterwards)
-{
-    if (ended_) {
-        return false;
-    }
-    if (!ready_) {
-        proceedWithHandshake(afterwards);
-        return false;
-    }
-    if ((events & EPOLLOUT) != 0) {
-        processOutput(afterwards);
-    }
-    const bool hasRead = !ended_ && processInput(afterwards);
-    if (!ended_) {
-        checkOutgoing(afterwards);
-    }
-    return hasRead && !ended_;
-}
-
 void BusLink::arm()
 {
-    watch_->arm(static_cast<std::uint32_t>(sd_bus_get_events(bus_.get())));
+    auto events = ready_ ? static_cast<std::uint32_t>(sd_bus_get_events(bus_.get())) : EPOLLIN;
+    events &= inputHeld_ ? ~std::uint32_t{EPOLLIN} : ~std::uint32_t{};
+    if (events != 0) {
+        watch_->arm(events);
+    }
 }
 
 void BusLink::proceedWithHandshake(Afterwards& afterwards)
@@ -168,7 +109,7 @@ void BusLink::proceedWithHandshake(Afterwards& afterwards)
     } else if (handshake_->state() == Handshake::State::done) {
         becomeReady(afterwards);
     } else {
-        watch_->arm(EPOLLIN);
+        arm();
     }
 }
 
@@ -200,107 +141,13 @@ void BusLink::becomeReady(Afterwards& afterwards)
     }
 }
 
-/// Reads at most one message; true if there was one.
-bool BusLink::processInput(Afterwards& afterwards)
-{
-    using Outcome = MessageReception::Outcome;
-    const auto outcome = reception_.next(bus_.socket());
-    if (outcome == Outcome::ready) {
-        processReadyMessage(afterwards);
-        return true;
-    }
-    if (outcome == Outcome::assembled) {
-        processAssembledMessage(afterwards);
-        return true;
-    }
-    if (outcome == Outcome::begun) {
-        awaitRest();
-    } else if (outcome == Outcome::closed) {
-        end(afterwards, true);
-    } else if (const auto* offence = offenceOf(outcome)) {
-        punishLocked(offence, afterwards);
-    }
-    return false;
-}
-
-void BusLink::processReadyMessage(Afterwards& afterwards)
-{
-    sd_bus_message* raw = nullptr;
-    const int result = bus_.readMessage(&raw);
-    const BusMessage message(raw);
-    if (result == -EBADMSG) {
-        punishLocked(noMessage, afterwards);
-    } else if (result < 0 || sd_bus_is_open(bus_.get()) <= 0) {
-        abandonLocked(errorText(result), afterwards);
-    } else if (message) {
-        receive(message.get(), afterwards);
-    }
-}
-
-void BusLink::processAssembledMessage(Afterwards& afterwards)
-{
-    context_->dispose(std::move(messageTimer_));
-    MessageDecoder decoder;
-    if (auto* message = decoder.decode(reception_.take())) {
-        receive(message, afterwards);
-    } else {
-        punishLocked(noMessage, afterwards);
-    }
-}
-
-void BusLink::awaitRest()
-{
-    if (!messageTimer_) {
-        startTimer(messageTimer_, context_->limits.wholeMessage, "it did not finish a message in time");
-    }
-}
-
 void BusLink::processOutput(Afterwards& afterwards)
 {
     const int result = outgoing_.isEmpty() ? 0 : bus_.writeOnly();
-    if (result < 0) {
+    // A peer that has hung up makes sd-bus close its socket, and that is no failure to it.
+    if (result < 0 || sd_bus_is_open(bus_.get()) <= 0) {
         abandonLocked(errorText(result), afterwards);
     }
-}
-
-void BusLink::receive(sd_bus_message* message, Afterwards& afterwards)
-{
-    if (sd_bus_message_is_method_call(message, nullptr, nullptr) > 0) {
-        if (const auto owner = owner_.lock()) {
-            afterwards.push_back([owner] {});
-            owner->receivedCall(*this, message, afterwards);
-        }
-        return;
-    }
-    std::uint8_t type = 0;
-    sd_bus_message_get_type(message, &type);
-    if (type != SD_BUS_MESSAGE_SIGNAL) {
-        complete(message, afterwards);
-    }
-}
-
-void BusLink::complete(sd_bus_message* message, Afterwards& afterwards)
-{
-    std::uint64_t cookie = 0;
-    const bool hasCookie = sd_bus_message_get_reply_cookie(message, &cookie) >= 0;
-    const auto number = hasCookie ? numberByCookie_.find(cookie) : numberByCookie_.end();
-    if (number == numberByCookie_.end()) {
-        return;
-    }
-    if (sd_bus_message_is_method_error(message, nullptr) > 0) {
-        const auto* error = sd_bus_message_get_error(message);
-        const std::string text = error->message == nullptr ? "" : error->message;
-        completeCall(number->second, {std::nullopt, {error->name, text}}, afterwards);
-        return;
-    }
-    const auto& call = pending_.at(number->second).call;
-    auto reading = readMessage(message, call.outTypes, peer, context_->limits.message);
-    IpcError error;
-    if (!reading.arguments) {
-        error = {ipc_errors::failed,
-                 "the reply of " + call.member + " does not fit \"" + call.outTypes + "\""};
-    }
-    completeCall(number->second, {std::move(reading.arguments), std::move(error)}, afterwards);
 }
 
 void BusLink::completeCall(std::uint64_t number, CallResult result, Afterwards& afterwards)
@@ -504,6 +351,7 @@ void BusLink::end(Afterwards& afterwards, bool tellOwner)
     watch_.reset();
     context_->dispose(std::move(handshakeTimer_));
     context_->dispose(std::move(messageTimer_));
+    context_->dispose(std::move(restTimer_));
     reception_.take();
     outgoing_.clear();
     while (!pending_.empty()) {

@@ -10,12 +10,14 @@
 #include "platform/linux/message_reception.h"
 #include "platform/linux/opened_bus.h"
 #include "platform/linux/outgoing_queue.h"
+#include "platform/linux/received_call.h"
 
 #include <cstdint>
 #include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -32,11 +34,14 @@ public:
     /// What is left to do once the lock is released.
     using Afterwards = std::vector<std::function<void()>>;
 
-    /// Told what arrives, under the link's lock: it may answer, and leaves everything else for afterwards.
     class Owner {
     public:
         virtual ~Owner() = default;
-        virtual void receivedCall(BusLink& link, sd_bus_message* call, Afterwards& afterwards) = 0;
+        /// What a call says. Without the link's lock, if `call` belongs to no bus that others use.
+        virtual ReceivedCall readCall(const BusLink& link, sd_bus_message* call) = 0;
+        /// Told what arrives, under the link's lock: it may answer, and leaves everything else for
+        /// afterwards.
+        virtual void receivedCall(BusLink& link, ReceivedCall call, Afterwards& afterwards) = 0;
         /// Once, unless `close` was called before.
         virtual void linkClosed(BusLink& link, Afterwards& afterwards) = 0;
     };
@@ -92,19 +97,30 @@ private:
 
     template <class Body>
     void locked(Body body);
+    /// What is to be done after something was read.
+    enum class Next { wait, read, decode };
+
     void handleEvents(std::uint32_t events);
+    Next handleInput(std::uint32_t events, Afterwards& afterwards);
+    Next processInput(Afterwards& afterwards);
+    void processReadyMessage(Afterwards& afterwards);
+    Next processAssembledMessage(Afterwards& afterwards);
+    void awaitRest();
+    void decode();
+    void deliver(sd_bus_message* message);
+    void queueDecoding(Afterwards& afterwards);
+    static Task<void> decodeInTurn(std::shared_ptr<BusLink> self);
+    void proceedAfter(std::chrono::nanoseconds taken, bool hasHungUp);
+    void rest(std::chrono::nanoseconds duration);
+    void endRest();
     void proceedWithHandshake(Afterwards& afterwards);
     void becomeReady(Afterwards& afterwards);
-    bool handleInput(std::uint32_t events, Afterwards& afterwards);
-    bool processInput(Afterwards& afterwards);
-    void processReadyMessage(Afterwards& afterwards);
-    void processAssembledMessage(Afterwards& afterwards);
-    void awaitRest();
     void processOutput(Afterwards& afterwards);
     void watch(int descriptor);
     void startTimer(std::unique_ptr<Timer>& timer, std::chrono::nanoseconds delay, const char* offence);
     void receive(sd_bus_message* message, Afterwards& afterwards);
-    void complete(sd_bus_message* message, Afterwards& afterwards);
+    std::optional<std::uint64_t> numberOfReply(sd_bus_message* message) const;
+    CallResult readReply(sd_bus_message* message, const OutgoingCall& call) const;
     void completeCall(std::uint64_t number, CallResult result, Afterwards& afterwards);
     void transmit(std::uint64_t number, Afterwards& afterwards);
     BusMessage newCall(const OutgoingCall& call);
@@ -129,16 +145,35 @@ private:
     std::unique_ptr<EventPool::Watch> watch_;
     std::unique_ptr<Timer> handshakeTimer_;
     std::unique_ptr<Timer> messageTimer_;
+    std::unique_ptr<Timer> restTimer_;
     /// Tells a timer whose handler comes late from its successor; there is one at a time.
     std::uint64_t timersStarted_ = 0;
     bool ready_ = false;
     bool ended_ = false;
     bool descriptorsAllowed_ = false;
+    /// Nothing is read: a message is being decoded, or the peer has to rest.
+    bool inputHeld_ = false;
+    /// The message that `reception_` has put together waits to be decoded.
+    bool decodingDue_ = false;
     MessageReception reception_;
     OutgoingQueue outgoing_;
     std::uint64_t lastNumber_ = 0;
     std::map<std::uint64_t, PendingCall> pending_;
     std::map<std::uint64_t, std::uint64_t> numberByCookie_;
 };
+
+/// Runs `body` under the lock, then what it left for afterwards.
+template <class Body>
+void BusLink::locked(Body body)
+{
+    Afterwards afterwards;
+    {
+        const std::lock_guard lock(mutex_);
+        body(afterwards);
+    }
+    for (const auto& action : afterwards) {
+        action();
+    }
+}
 
 }  // namespace typhon

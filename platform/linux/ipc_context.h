@@ -7,6 +7,7 @@
 #include "platform/linux/ipc_limits.h"
 #include "platform/linux/memory_return.h"
 #include "platform/linux/offender_log.h"
+#include "platform/linux/peer_pace.h"
 #include "platform/linux/root_directory.h"
 #include "platform/log.h"
 #include "platform/work_queues.h"
@@ -78,6 +79,9 @@ struct IpcContext {
     const std::shared_ptr<HeldBytes> heldBytes;
     const std::shared_ptr<MemoryReturn> memoryReturn;
     OffenderLog offenders;
+    PeerPace pace;
+    /// Where large messages are understood, one after another.
+    const std::shared_ptr<WorkQueue> largeMessages;
     LiveObjects<LinuxConnection> connections;
     LiveObjects<LinuxListener> listeners;
 

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/linux/bus_message_codec.h"
+#include "platform/linux/peer_pace.h"
 
 #include <chrono>
 #include <cstddef>
@@ -35,6 +36,8 @@ struct IpcLimits {
     /// and of all processes of one user.
     std::size_t heldBytesPerProcess = 128U << 20;
     std::size_t heldBytesPerUser = 512U << 20;
+    /// What of our time one process may take.
+    PaceLimits pace;
     /// From the end of a connection until free memory is given back to the system; zero for never.
     std::chrono::nanoseconds memoryReturn{};
 };
@@ -46,6 +49,7 @@ inline IpcLimits limitsOfDaemon()
     limits.message.memoryFileBytes = 16U << 20;
     limits.message.memoryFileValues = 1U << 20;
     limits.memoryReturn = std::chrono::seconds(10);
+    limits.pace.allowance = std::chrono::milliseconds(250);
     return limits;
 }
 

@@ -56,7 +56,8 @@ public:
     Task<CallResult> callAndWait(std::string interface, std::string member, Arguments arguments,
                                  std::int64_t timeout) override;
 
-    void receivedCall(BusLink& link, sd_bus_message* call, BusLink::Afterwards& afterwards) override;
+    ReceivedCall readCall(const BusLink& link, sd_bus_message* call) override;
+    void receivedCall(BusLink& link, ReceivedCall call, BusLink::Afterwards& afterwards) override;
     void linkClosed(BusLink& link, BusLink::Afterwards& afterwards) override;
 
 private:
@@ -68,9 +69,8 @@ private:
     std::shared_ptr<BusLink> connect(std::unique_ptr<ConnectionAccounting::Charge>& charge);
     void startCall(std::string_view interface, std::string_view member, Arguments arguments, bool expectReply,
                    std::int64_t timeout, BusLink::Completion completion);
-    void answerOther(BusLink& link, sd_bus_message* call, const CallTarget& target,
-                     const InterfaceDescriptions& interfaces, BusLink::Afterwards& afterwards);
-    void refuseExcess(BusLink& link, sd_bus_message* call, BusLink::Afterwards& afterwards);
+    static void answerOther(BusLink& link, const ReceivedCall& call, BusLink::Afterwards& afterwards);
+    void refuseExcess(BusLink& link, const ReceivedCall& call, BusLink::Afterwards& afterwards);
     void enqueue(Item item, BusLink::Afterwards& afterwards);
     void enqueueError(const ErrorHandler& onError, IpcError error, BusLink::Afterwards& afterwards);
     Item takeItem();

@@ -87,6 +87,8 @@ std::shared_ptr<IpcContext> makeContext(EventPool& pool, WorkQueues& queues, Log
                        std::make_shared<HeldBytes>(limits.heldBytesPerProcess, limits.heldBytesPerUser),
                        std::move(memoryReturn),
                        OffenderLog(log),
+                       PeerPace(limits.pace),
+                       queues.createSerialQueue("com.vorlan.typhond.largeMessages"),
                        {},
                        {}});
 }

@@ -28,6 +28,8 @@ public:
 
     /// Connections that are resumed and not yet invalidated.
     std::size_t connectionCount() const;
+    /// Where large messages are understood, one after another.
+    WorkQueue& largeMessages() const { return *context_->largeMessages; }
 
 private:
     const std::shared_ptr<IpcContext> context_;

@@ -11,6 +11,7 @@
 #include <utility>
 
 #include <sys/socket.h>
+#include <sys/stat.h>
 
 namespace typhon {
 
@@ -178,6 +179,18 @@ bool MessageReception::keepDescriptors(msghdr& message)
     // Truncated: there was no room for more descriptors in the process.
     const auto limit = descriptorsAllowed_ ? limits_.descriptors : 0;
     return message_.descriptors.size() <= limit && (message.msg_flags & MSG_CTRUNC) == 0;
+}
+
+std::size_t MessageReception::assembledBytes() const
+{
+    auto bytes = message_.bytes.size();
+    for (const auto& descriptor : message_.descriptors) {
+        struct stat status = {};
+        if (::fstat(descriptor.get(), &status) == 0 && S_ISREG(status.st_mode)) {
+            bytes += static_cast<std::size_t>(status.st_size);
+        }
+    }
+    return bytes;
 }
 
 ReceivedMessage MessageReception::take()

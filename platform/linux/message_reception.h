@@ -55,6 +55,8 @@ public:
     /// Looks at the input of `socket`, which does not block, or reads more of the message that has begun.
     Outcome next(int socket);
     ReceivedMessage take();
+    /// Of the message that was put together, and of the files that came with it.
+    std::size_t assembledBytes() const;
     void allowDescriptors(bool allowed) { descriptorsAllowed_ = allowed; }
 
 private:

@@ -1,0 +1,133 @@
+// Large messages, and peers that send faster than they are answered: they hold up themselves only.
+
+#include "platform/linux/memory_file.h"
+#include "platform/linux/property_list_writer.h"
+#include "testing/ipc_service.h"
+#include "testing/wire_message.h"
+
+#include <functional>
+#include <future>
+#include <string>
+
+#include <sys/socket.h>
+
+namespace typhon {
+namespace {
+
+using namespace std::chrono_literals;
+
+IpcLimits pacedLimits()
+{
+    IpcLimits limits;
+    limits.pace = {.allowance = 1h, .oneIn = 2, .connection = 1us, .longestRest = 100ms};
+    return limits;
+}
+
+/// A dictionary in a message, with one value that is a memory file of many megabytes.
+sd_bus_message* largeCall(ForeignClient& client)
+{
+    PropertyList::Array values;
+    while (values.size() < 200'000) {
+        values.emplace_back("the value number " + std::to_string(values.size()));
+    }
+    const auto file = sealedMemoryFile(writeBinaryPropertyList(PropertyList(std::move(values))));
+    auto* call = client.newCall("dictionary");
+    EXPECT_GE(sd_bus_message_append(call, "a{sv}", 1, "large", "h", file.get()), 0);
+    return call;
+}
+
+/// Occupies a queue until it is destroyed.
+class Occupation {
+public:
+    explicit Occupation(WorkQueue& queue)
+    {
+        const std::function<void()> occupy = [this] {
+            occupied_.set_value();
+            left_.get_future().wait();
+        };
+        queue.async(occupy);
+        occupied_.get_future().wait();
+    }
+    ~Occupation() { left_.set_value(); }
+
+private:
+    std::promise<void> occupied_;
+    std::promise<void> left_;
+};
+
+TEST(LinuxIpcPace, ALargeValueHoldsUpNeitherItsOwnLinkNorOthers)
+{
+    TestedService service(pacedLimits());
+    ForeignClient client(service.path());
+    ForeignClient other(service.path());
+    client.start("hold");
+    ASSERT_GE(sd_bus_flush(client.bus), 0);
+    ASSERT_TRUE(service.log.waitFor("holding a call"));
+    std::uint64_t cookie = 0;
+    auto* call = largeCall(client);
+    {
+        const Occupation nothingLargeIsDecoded(service.ipc->largeMessages());
+        ASSERT_GE(sd_bus_send(client.bus, call, &cookie), 0);
+        ASSERT_GE(sd_bus_flush(client.bus), 0);
+        // Others are served, and the link is written to.
+        EXPECT_EQ(other.call("releaseAll"), "");
+        pollfd answered{sd_bus_get_fd(client.bus), POLLIN, 0};
+        EXPECT_EQ(::poll(&answered, 1, 20'000), 1);
+        EXPECT_TRUE(other.isAlive());
+    }
+    // What comes behind it comes later.
+    EXPECT_TRUE(client.isAlive());
+    sd_bus_message_unref(call);
+    EXPECT_EQ(client.finish(largeCall(client)), "");
+}
+
+TEST(LinuxIpcPace, AConnectionMayEndWhileItsLargeValueWaits)
+{
+    TestedService service(pacedLimits());
+    {
+        const Occupation nothingLargeIsDecoded(service.ipc->largeMessages());
+        ForeignClient client(service.path());
+        auto* call = largeCall(client);
+        ASSERT_GE(sd_bus_send(client.bus, call, nullptr), 0);
+        ASSERT_GE(sd_bus_flush(client.bus), 0);
+        sd_bus_message_unref(call);
+    }
+    ForeignClient other(service.path());
+    EXPECT_EQ(other.finish(largeCall(other)), "");
+}
+
+TEST(LinuxIpcPace, WhoSendsFasterThanItIsAnsweredRestsAndLosesNothing)
+{
+    auto limits = pacedLimits();
+    limits.pace.allowance = 1ns;
+    limits.pace.longestRest = 5ms;
+    TestedService service(limits);
+    const std::string text = "paced";
+    std::string burst;
+    for (int count = 0; count < 200; ++count) {
+        burst += WireMessage::call(1, testedInterface, "note", &text);
+    }
+    const auto socket = rawConnection(service.path());
+    write(socket, pipelinedHandshake() + burst);
+    EXPECT_TRUE(service.log.waitFor("noted paced", 200));
+}
+
+TEST(LinuxIpcPace, APeerMayLeaveWhileItRestsWithAnswersUnread)
+{
+    auto limits = pacedLimits();
+    limits.pace.allowance = 1ns;
+    TestedService service(limits);
+    std::string burst;
+    for (int count = 0; count < 500; ++count) {
+        burst += WireMessage::call(1, "org.freedesktop.DBus.Introspectable", "Introspect");
+    }
+    for (int times = 0; times < 20; ++times) {
+        const auto socket = rawConnection(service.path());
+        write(socket, pipelinedHandshake() + burst);
+    }
+    ForeignClient other(service.path());
+    EXPECT_TRUE(other.isAlive());
+}
+
+}  // namespace
+}  // namespace typhon
