@@ -1,7 +1,7 @@
 #include "platform/linux/downloads.h"
 #include "platform/linux/scratch_directory.h"
 
-#include <filesystem>
+#include <csignal>
 #include <future>
 
 #include <gmock/gmock.h>
@@ -16,7 +16,7 @@ using ::testing::HasSubstr;
 
 constexpr auto patience = 60s;
 
-/// A program in the place of the downloader writes down the requests it gets, and ends when it is told to.
+/// A program in the place of the downloader writes down the requests it gets, and then only waits.
 class DownloadsTest : public testing::Test {
 protected:
     DownloadsTest()
@@ -25,15 +25,12 @@ protected:
                                       "dd bs=16384 count=1 2>/dev/null >>" +
                                           scratch.real("/requests") +
                                           "\n"
-                                          "echo begun >" +
+                                          "echo $$ >" +
                                           scratch.real("/begun") +
                                           "\n"
-                                          "read line <" +
-                                          scratch.real("/end") + "\n");
+                                          "exec sleep 1000\n");
         ::chmod(scratch.real("/program").c_str(), 0700);
-        for (const auto* name : {"/begun", "/end"}) {
-            ::mkfifo(scratch.real(name).c_str(), 0600);
-        }
+        ::mkfifo(scratch.real("/begun").c_str(), 0600);
     }
     ~DownloadsTest() override { pool.stop(); }
 
@@ -56,9 +53,9 @@ protected:
         EXPECT_EQ(future.wait_for(patience), std::future_status::ready);
         return future.get();
     }
-    /// Both block until the program is at the other end of the pipe.
-    void waitUntilBegun() const { EXPECT_EQ(scratch.readFile("/begun"), "begun\n"); }
-    void endOne() const { scratch.writeFile("/end", "end\n"); }
+    /// The process that begins next; blocks until one does. Two must not begin at the same time.
+    pid_t waitUntilBegun() const { return std::stoi(scratch.readFile("/begun")); }
+    static void end(pid_t process) { ::kill(process, SIGKILL); }
     bool wasAsked(const std::string& url) const
     {
         return scratch.readFile("/requests").find(url) != std::string::npos;
@@ -98,18 +95,18 @@ TEST_F(DownloadsTest, ADiscretionaryDownloadWaitsUntilNoOtherRuns)
 {
     Downloads downloads(pool, root, scratch.real("/program"));
     auto urgent = start(downloads, "the-urgent-one");
-    waitUntilBegun();
+    const auto first = waitUntilBegun();
     auto patient = start(downloads, "the-patient-one", true);
     auto another = start(downloads, "another-urgent-one");
-    waitUntilBegun();
+    const auto second = waitUntilBegun();
     EXPECT_FALSE(wasAsked("the-patient-one"));
-    endOne();
-    endOne();
+    end(first);
+    end(second);
     errorOf(urgent);
     errorOf(another);
-    waitUntilBegun();
+    const auto last = waitUntilBegun();
     EXPECT_TRUE(wasAsked("the-patient-one"));
-    endOne();
+    end(last);
     errorOf(patient);
 }
 
@@ -117,9 +114,10 @@ TEST_F(DownloadsTest, FewRunAtATimeAndWhatIsBeyondTheLineIsRefused)
 {
     Downloads downloads(pool, root, scratch.real("/program"));
     std::vector<std::future<std::string>> running;
+    pid_t last = -1;
     for (std::size_t number = 0; number < Downloads::mostRunning; ++number) {
         running.push_back(start(downloads, "running"));
-        waitUntilBegun();
+        last = waitUntilBegun();
     }
     for (std::size_t number = 0; number < Downloads::mostWaiting; ++number) {
         start(downloads, "waiting");
@@ -127,7 +125,7 @@ TEST_F(DownloadsTest, FewRunAtATimeAndWhatIsBeyondTheLineIsRefused)
     auto beyond = start(downloads, "beyond");
     EXPECT_EQ(errorOf(beyond), "too many downloads are waiting");
     EXPECT_FALSE(wasAsked("waiting"));
-    endOne();
+    end(last);
     waitUntilBegun();
     EXPECT_TRUE(wasAsked("waiting"));
 }
