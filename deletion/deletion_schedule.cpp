@@ -3,7 +3,6 @@
 #include "deletion/deletion_paths.h"
 
 #include <algorithm>
-#include <utility>
 
 namespace typhon {
 
@@ -56,6 +55,33 @@ PropertyList::Dictionary waitingAmong(const PropertyList::Dictionary& entries, d
     return waiting;
 }
 
+/// Gives the number of paths that found no room.
+std::size_t recordIn(PropertyList::Dictionary& entries, const std::vector<std::string>& paths,
+                     const PropertyList& due)
+{
+    auto bytes = storedBytes(entries);
+    std::size_t withoutRoom = 0;
+    for (const auto& path : paths) {
+        if (!isInFontTree(path)) {
+            continue;
+        }
+        if (const auto known = entries.find(path); known != entries.end()) {
+            // Intended: the latest request counts, also when that brings the date forward.
+            known->second = due;
+            continue;
+        }
+        const auto more = storedBytes(path);
+        if (entries.size() >= DeletionSchedule::mostEntries ||
+            bytes + more > DeletionSchedule::mostBytes) {
+            ++withoutRoom;
+            continue;
+        }
+        entries.emplace(path, due);
+        bytes += more;
+    }
+    return withoutRoom;
+}
+
 }  // namespace
 
 bool DeletionSchedule::isEmpty()
@@ -66,29 +92,11 @@ bool DeletionSchedule::isEmpty()
 
 std::size_t DeletionSchedule::record(const std::vector<std::string>& paths, Date due)
 {
-    auto entries = preferences_.dictionary(deleteKey);
-    auto bytes = storedBytes(entries);
-    const PropertyList date(due);
     std::size_t withoutRoom = 0;
-    for (const auto& path : paths) {
-        if (!isInFontTree(path)) {
-            continue;
-        }
-        if (const auto known = entries.find(path); known != entries.end()) {
-            // Intended: the latest request counts, also when that brings the date forward.
-            known->second = date;
-            continue;
-        }
-        const auto more = storedBytes(path);
-        if (entries.size() >= mostEntries || bytes + more > mostBytes) {
-            ++withoutRoom;
-            continue;
-        }
-        entries.emplace(path, date);
-        bytes += more;
-    }
+    preferences_.changeDictionary(
+        deleteKey, [&](PropertyList::Dictionary& entries) { withoutRoom = recordIn(entries, paths, due); });
     // Intended: also when no path was taken.
-    store(std::move(entries));
+    preferences_.synchronize();
     return withoutRoom;
 }
 
@@ -112,15 +120,10 @@ DueFiles DeletionSchedule::takeDue(double now)
         }
     }
     if (isChanged) {
-        store(waitingAmong(*entries, now));
+        preferences_.setValue(deleteKey, waitingAmong(*entries, now));
+        preferences_.synchronize();
     }
     return found;
-}
-
-void DeletionSchedule::store(PropertyList::Dictionary entries)
-{
-    preferences_.setValue(deleteKey, std::move(entries));
-    preferences_.synchronize();
 }
 
 }  // namespace typhon

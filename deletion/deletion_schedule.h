@@ -44,8 +44,6 @@ public:
     DueFiles takeDue(double now);
 
 private:
-    void store(PropertyList::Dictionary entries);
-
     Preferences& preferences_;
 };
 

@@ -3,8 +3,10 @@
 #include "platform/property_list.h"
 
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <string>
+#include <utility>
 
 namespace typhon {
 
@@ -18,6 +20,16 @@ public:
     virtual std::optional<PropertyList> value(const std::string& key) = 0;
     /// Changes `key` (null removes it) in memory; `synchronize` makes it durable.
     virtual void setValue(const std::string& key, std::optional<PropertyList> value) = 0;
+    /// Changes the entries of a dictionary preference in memory, for long dictionaries without copying them.
+    /// One that is missing or of another kind is changed from an empty one. `change` runs once, before this
+    /// returns, and uses no preferences.
+    virtual void changeDictionary(const std::string& key,
+                                  const std::function<void(PropertyList::Dictionary& entries)>& change)
+    {
+        auto entries = dictionary(key);
+        change(entries);
+        setValue(key, std::move(entries));
+    }
     /// Writes the changes to disk and flushes them, at the level of the store and of the whole domain.
     /// False when that failed: it is logged, and the changes are kept for the next time.
     virtual bool synchronize() = 0;

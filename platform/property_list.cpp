@@ -254,6 +254,19 @@ const PropertyList* PropertyList::find(std::string_view key) const noexcept
     return found == dictionary->end() ? nullptr : &found->second;
 }
 
+Dictionary PropertyList::takeDictionary() &&
+{
+    const auto contents = std::move(contents_);
+    const auto* dictionary = contentsAs<Dictionary>(contents);
+    if (dictionary == nullptr)
+        return {};
+    if (contents.use_count() != 1)
+        return *dictionary;
+    // Another thread may only just have let go of its copy: to count up and down waits for what it still read.
+    std::shared_ptr<const Contents>(contents).reset();
+    return std::move(*const_cast<Dictionary*>(dictionary));
+}
+
 bool PropertyList::isTrue() const noexcept
 {
     const bool* boolean = asBoolean();

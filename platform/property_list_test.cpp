@@ -136,6 +136,25 @@ TEST(PropertyListTest, MovedFromReadsAsTheEmptyDictionary)
     EXPECT_EQ(*taken.asString(), "text");
 }
 
+TEST(PropertyListTest, ATakenDictionaryIsCopiedOnlyWhenItIsShared)
+{
+    PropertyList value = Dictionary{{"entry", 1}};
+    const PropertyList shared = value;
+    const auto* const entries = shared.asDictionary();
+    auto taken = std::move(value).takeDictionary();
+    taken.at("entry") = 2;
+    EXPECT_EQ(shared, PropertyList(Dictionary{{"entry", 1}}));
+    EXPECT_NE(&taken.begin()->first, &entries->begin()->first);
+
+    PropertyList sole = Dictionary{{"entry", 1}};
+    const auto* const key = &sole.asDictionary()->begin()->first;
+    const auto moved = std::move(sole).takeDictionary();
+    EXPECT_EQ(&moved.begin()->first, key);
+    EXPECT_EQ(sole, PropertyList());  // NOLINT(bugprone-use-after-move): it says what is left
+    EXPECT_TRUE(PropertyList("text").takeDictionary().empty());
+    EXPECT_TRUE(PropertyList().takeDictionary().empty());
+}
+
 TEST(PropertyListTest, FindLooksOnlyIntoDictionaries)
 {
     const PropertyList value(Dictionary{{"present", "here"}});

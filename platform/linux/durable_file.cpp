@@ -103,7 +103,7 @@ std::optional<std::string> makeDirectories(const std::string& path, mode_t permi
 std::optional<std::string> prepareReplacement(const std::string& path, std::span<const std::uint8_t> contents,
                                               mode_t permissions)
 {
-    const auto temporary = path + ".new";
+    const auto temporary = replacementOf(path);
     auto error = writeNewFile(temporary, contents, permissions);
     if (error) {
         ::unlink(temporary.c_str());
@@ -113,13 +113,18 @@ std::optional<std::string> prepareReplacement(const std::string& path, std::span
 
 std::optional<std::string> finishReplacement(const std::string& path)
 {
-    const auto temporary = path + ".new";
+    const auto temporary = replacementOf(path);
     if (::rename(temporary.c_str(), path.c_str()) != 0) {
         auto error = failure("replace", path);
         ::unlink(temporary.c_str());
         return error;
     }
     return flushDirectory(directoryOf(path));
+}
+
+std::string replacementOf(const std::string& path)
+{
+    return path + ".new";
 }
 
 std::optional<std::string> replaceFile(const std::string& path, std::span<const std::uint8_t> contents,

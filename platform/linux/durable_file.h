@@ -45,6 +45,8 @@ std::optional<std::string> replaceFile(const std::string& path, std::span<const 
 std::optional<std::string> prepareReplacement(const std::string& path, std::span<const std::uint8_t> contents,
                                               mode_t permissions);
 std::optional<std::string> finishReplacement(const std::string& path);
+/// The path of the file in between the two.
+std::string replacementOf(const std::string& path);
 
 /// Flushes names that were added to, changed in or removed from a directory.
 std::optional<std::string> flushDirectory(const std::string& path);

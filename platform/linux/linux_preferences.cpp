@@ -8,7 +8,8 @@
 
 // Readers take the file as they find it, which its replacement as a whole makes safe. A writer locks out the
 // other writers, reads the file once more, applies its own changes key by key and replaces the file; so what
-// an administrator changed meanwhile under another key survives, and for one key the last writer wins.
+// an administrator changed meanwhile under another key survives, and for one key the last writer wins. What it
+// wrote itself is not read again, unless somebody has touched the file since.
 //
 // A store that cannot be understood reads as empty. It is kept aside before the first write. One that merely
 // could not be had (no permission, no descriptors, a failing disk) is not touched: writing fails then.
@@ -67,6 +68,29 @@ void LinuxPreferences::setValue(const std::string& key, std::optional<PropertyLi
     changed_.insert_or_assign(key, std::move(value));
 }
 
+void LinuxPreferences::changeDictionary(const std::string& key,
+                                        const std::function<void(PropertyList::Dictionary& entries)>& change)
+{
+    const std::lock_guard lock(mutex_);
+    auto entries = take(key).value_or(PropertyList()).takeDictionary();
+    change(entries);
+    changed_.insert_or_assign(key, std::move(entries));
+}
+
+/// The value of a key that gets another one before `mutex_` is let go; not shared with anything that is kept
+/// here, unless it is just being written.
+std::optional<PropertyList> LinuxPreferences::take(const std::string& key)
+{
+    if (const auto changed = changed_.find(key); changed != changed_.end()) {
+        return std::move(changed->second);
+    }
+    if (const auto written = beingWritten_.find(key); written != beingWritten_.end()) {
+        return written->second;
+    }
+    refresh();
+    return store_.take(key);
+}
+
 bool LinuxPreferences::synchronize()
 {
     const std::lock_guard oneWriter(writing_);
@@ -98,7 +122,13 @@ std::optional<std::string> LinuxPreferences::write()
     if (auto error = prepare(merged)) {
         return error;
     }
-    return store_.replace(merged);
+    auto replacement = store_.replace(merged);
+    auto error = std::move(replacement.error);
+    if (!error) {
+        const std::lock_guard lockOfStore(mutex_);
+        store_.adopt(std::move(replacement), std::move(merged));
+    }
+    return error;
 }
 
 /// Merges the changes, which are being written from now on, into the newest contents of the store.

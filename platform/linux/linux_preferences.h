@@ -5,6 +5,7 @@
 #include "platform/log.h"
 #include "platform/preferences.h"
 
+#include <functional>
 #include <map>
 #include <mutex>
 #include <optional>
@@ -22,6 +23,8 @@ public:
 
     std::optional<PropertyList> value(const std::string& key) override;
     void setValue(const std::string& key, std::optional<PropertyList> value) override;
+    void changeDictionary(const std::string& key,
+                          const std::function<void(PropertyList::Dictionary& entries)>& change) override;
     bool synchronize() override;
 
     /// All preferences, with unsynchronised changes.
@@ -30,6 +33,7 @@ public:
 private:
     using Changes = std::map<std::string, std::optional<PropertyList>>;
 
+    std::optional<PropertyList> take(const std::string& key);
     std::optional<std::string> write();
     std::optional<std::string> prepare(PropertyList::Dictionary& merged);
     std::optional<std::string> makeWritable();

@@ -93,6 +93,38 @@ TEST_F(LinuxPreferencesTest, NoticesAReplacedFileAndOneChangedInPlace)
     EXPECT_EQ(preferences.value("missed"), std::nullopt);
 }
 
+/// With a file as long as before, in the same tick of the clock more often than not.
+TEST_F(LinuxPreferencesTest, NoticesAFileThatWasChangedInPlaceOrReplacedRightAfterItsOwnWriting)
+{
+    const std::string padding(100'000, 'x');
+    for (int round = 0; round < 100; ++round) {
+        preferences.setValue("missed", PropertyList(1));
+        preferences.setValue("padding", PropertyList(padding));
+        ASSERT_TRUE(preferences.synchronize());
+        if (round % 2 == 1) {
+            std::filesystem::remove(scratch.real(store));
+        }
+        writeStore(PropertyList::Dictionary{{"missed", 2}, {"padding", padding}});
+        ASSERT_EQ(preferences.integer("missed"), 2);
+    }
+}
+
+/// The first writing that takes longer than a tick of the clock shows it.
+TEST_F(LinuxPreferencesTest, DoesNotReadAgainWhatItWroteItself)
+{
+    const auto isKept = [this](const PropertyList& written) {
+        preferences.setValue("text", written);
+        EXPECT_TRUE(preferences.synchronize());
+        const auto identity = preferences.value("text")->identity();
+        return !identity.owner_before(written.identity()) && !written.identity().owner_before(identity);
+    };
+    int writings = 1;
+    while (!isKept(PropertyList(std::string(4u << 20, 'x')))) {
+        ASSERT_LT(++writings, 1000);
+    }
+    EXPECT_EQ(LinuxPreferences(root, log).value("text"), preferences.value("text"));
+}
+
 TEST_F(LinuxPreferencesTest, MalformedStoreReadsAsEmptyIsLoggedOnceAndKeptAsideBeforeTheFirstWrite)
 {
     scratch.writeFile(store, "bplist00 and then nothing that makes sense");

@@ -18,6 +18,11 @@ constexpr std::size_t mostBytes = 16u << 20;
 constexpr mode_t filePermissions = 0600;
 constexpr int mostBrokenFiles = 9;
 
+PreferencesStore::Replacement failed(std::optional<std::string> error)
+{
+    return {.error = std::move(error), .file = {}, .identity = {}};
+}
+
 }  // namespace
 
 PreferencesStore::PreferencesStore(std::string path) : path_(std::move(path)) {}
@@ -72,6 +77,12 @@ void PreferencesStore::parse(const OpenedFile& opened)
     values_ = *values;
 }
 
+std::optional<PropertyList> PreferencesStore::take(const std::string& key)
+{
+    auto found = values_.extract(key);
+    return found ? std::optional(std::move(found.mapped())) : std::nullopt;
+}
+
 PreferencesStore::SetAside PreferencesStore::setAside()
 {
     int number = 1;
@@ -87,13 +98,39 @@ PreferencesStore::SetAside PreferencesStore::setAside()
     return {.path = name(), .error = flushDirectory(directoryOf(path_))};
 }
 
-std::optional<std::string> PreferencesStore::replace(const PropertyList::Dictionary& values) const
+PreferencesStore::Replacement PreferencesStore::replace(const PropertyList::Dictionary& values) const
 {
     const auto bytes = writeBinaryPropertyList(values);
     if (bytes.size() > mostBytes) {
-        return "the preferences would be larger than " + std::to_string(mostBytes) + " bytes";
+        return failed("the preferences would be larger than " + std::to_string(mostBytes) + " bytes");
     }
-    return replaceFile(path_, bytes, filePermissions);
+    if (auto error = prepareReplacement(path_, bytes, filePermissions)) {
+        return failed(std::move(error));
+    }
+    auto written = openRegularFile(replacementOf(path_));
+    const FileIdentity before(written.status);
+    const bool isSettled = written.error == 0 && before.hasSettledContents();
+    if (auto error = finishReplacement(path_)) {
+        return failed(std::move(error));
+    }
+    // The renaming changed its change time. Whoever writes into it from now on changes its modification time,
+    // however early: the contents were settled before it got its name.
+    struct stat status {};
+    if (!isSettled || ::fstat(written.file.get(), &status) != 0 ||
+        !FileIdentity(status).hasContentsOf(before)) {
+        return {};
+    }
+    return {.error = {}, .file = std::move(written.file), .identity = FileIdentity(status)};
+}
+
+void PreferencesStore::adopt(Replacement replacement, PropertyList::Dictionary values)
+{
+    if (replacement.file) {
+        become(State::readable, {});
+        values_ = std::move(values);
+        identity_ = replacement.identity;
+        read_ = std::move(replacement.file);
+    }
 }
 
 }  // namespace typhon

@@ -23,19 +23,38 @@ int openAsPath(int directory, const std::string& path, std::uint64_t resolve)
     return static_cast<int>(::syscall(SYS_openat2, directory, path.c_str(), &how, sizeof how));
 }
 
+/// By the kernel's clock for the times of files, which moves on by a tick now and then.
+bool isPast(std::int64_t seconds, std::int64_t nanoseconds)
+{
+    timespec now{};
+    ::clock_gettime(CLOCK_REALTIME_COARSE, &now);
+    return std::pair(seconds, nanoseconds) < std::pair(std::int64_t(now.tv_sec), std::int64_t(now.tv_nsec));
+}
+
 }  // namespace
 
 FileIdentity::FileIdentity(const struct stat& status)
     : device(status.st_dev), inode(status.st_ino), changeSeconds(status.st_ctim.tv_sec),
-      changeNanoseconds(status.st_ctim.tv_nsec), size(status.st_size)
+      changeNanoseconds(status.st_ctim.tv_nsec), modificationSeconds(status.st_mtim.tv_sec),
+      modificationNanoseconds(status.st_mtim.tv_nsec), size(status.st_size)
 {}
 
 bool FileIdentity::isSettled() const
 {
-    timespec now{};
-    ::clock_gettime(CLOCK_REALTIME_COARSE, &now);
-    return std::pair(changeSeconds, changeNanoseconds) <
-           std::pair(std::int64_t(now.tv_sec), std::int64_t(now.tv_nsec));
+    return isPast(changeSeconds, changeNanoseconds);
+}
+
+bool FileIdentity::hasSettledContents() const
+{
+    return isPast(modificationSeconds, modificationNanoseconds);
+}
+
+bool FileIdentity::hasContentsOf(const FileIdentity& earlier) const
+{
+    auto same = earlier;
+    same.changeSeconds = changeSeconds;
+    same.changeNanoseconds = changeNanoseconds;
+    return *this == same;
 }
 
 OpenedFile openRegularFile(const std::string& path, int directory, std::uint64_t resolve)

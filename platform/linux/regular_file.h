@@ -21,6 +21,8 @@ struct FileIdentity {
     std::uint64_t inode = 0;
     std::int64_t changeSeconds = 0;
     std::int64_t changeNanoseconds = 0;
+    std::int64_t modificationSeconds = 0;
+    std::int64_t modificationNanoseconds = 0;
     std::int64_t size = 0;
 
     FileIdentity() = default;
@@ -32,6 +34,11 @@ struct FileIdentity {
     /// clock for such times, which may stand still for some milliseconds. Asked before a reading, it says
     /// whether that reading may be kept for as long as the identity stays.
     bool isSettled() const;
+    /// The same of changes to its contents alone: for a file that is about to be renamed.
+    bool hasSettledContents() const;
+    /// True for the same file with the same contents, if those were settled at the time of this one. It may
+    /// have been renamed or given other permissions since.
+    bool hasContentsOf(const FileIdentity& earlier) const;
 };
 
 /// An open regular file, or why there is none.

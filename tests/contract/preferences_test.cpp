@@ -156,6 +156,37 @@ TEST_P(PreferencesContract, UnderOneKeyTheLastWriterWins)
     EXPECT_EQ(preferences().integer("missed"), 8);
 }
 
+TEST_P(PreferencesContract, ADictionaryIsChangedFromTheNewestEntriesThatThereAre)
+{
+    const auto add = [this](const std::string& entry) {
+        preferences().changeDictionary("delete",
+                                       [&](PropertyList::Dictionary& entries) { entries.emplace(entry, 1); });
+    };
+    add("written");
+    const auto before = preferences().value("delete");
+    EXPECT_TRUE(preferences().synchronize());
+    subject->changeFromOutside("delete", PropertyList::Dictionary{{"outside", 2}});
+    add("changed");
+    add("changed again");
+    const PropertyList expected =
+        PropertyList::Dictionary{{"changed", 1}, {"changed again", 1}, {"outside", 2}};
+    EXPECT_EQ(preferences().value("delete"), expected);
+    EXPECT_TRUE(preferences().synchronize());
+    subject->restart();
+    EXPECT_EQ(preferences().value("delete"), expected);
+    EXPECT_EQ(before, PropertyList(PropertyList::Dictionary{{"written", 1}}));
+}
+
+TEST_P(PreferencesContract, WhatIsNoDictionaryIsChangedFromAnEmptyOne)
+{
+    subject->changeFromOutside("delete", PropertyList("text"));
+    preferences().changeDictionary("delete", [](PropertyList::Dictionary& entries) {
+        EXPECT_TRUE(entries.empty());
+        entries.emplace("entry", 1);
+    });
+    EXPECT_EQ(preferences().value("delete"), PropertyList(PropertyList::Dictionary{{"entry", 1}}));
+}
+
 INSTANTIATE_TEST_SUITE_P(, PreferencesContract,
                          testing::Values(Implementation{"Simulated", std::make_unique<SimulatedSubject>},
                                          Implementation{"Linux", std::make_unique<LinuxSubject>}),
