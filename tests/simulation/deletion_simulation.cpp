@@ -16,6 +16,10 @@
 // told of every step and looks at the device after every pass: a file may be gone only if it was scheduled
 // and came within three minutes of its date while a pass ran; nothing that is due survives a pass; and a
 // restart brings a pass. Sentinels outside the trees have to be there in the end.
+//
+// The disk fails now and then, for a while: then the daemon goes by what it has in memory, and a restart by
+// what was flushed last. That is all of one recording, or nothing of it, also when the daemon ends in its
+// middle.
 
 namespace typhon::simulation {
 
@@ -58,8 +62,10 @@ public:
     {
         restart();
         for (std::uint64_t step = 0; step < stepsOfARun; ++step) {
+            flushesBefore_ = flushes();
             takeStep();
             judge();
+            judgeDisk();
         }
         bringEverythingDue();
         for (const auto& path : sentinels()) {
@@ -85,7 +91,7 @@ private:
 
     void takeStep()
     {
-        switch (pick(8)) {
+        switch (pick(11)) {
         case 0:
             restart();
             break;
@@ -101,6 +107,13 @@ private:
             break;
         case 5:
             addFile();
+            break;
+        case 6:
+            isDiskFailing_ = !isDiskFailing_;
+            simulated_.preferences.setFailing(isDiskFailing_);
+            break;
+        case 7:
+            scheduleAndDie();
             break;
         default:
             advance(static_cast<double>(pick(20'000)));
@@ -120,20 +133,53 @@ private:
         present_.insert(path);
     }
 
-    /// Some hostile path is nearly always among them.
-    void schedule()
+    /// With a hostile one among them.
+    std::vector<std::string> somePaths()
     {
         std::vector<std::string> paths;
         for (auto count = pick(4); count != 0; --count) {
             paths.push_back(somePath());
         }
         paths.push_back(hostilePaths()[pick(hostilePaths().size())]);
+        return paths;
+    }
+
+    void expectScheduled(const std::vector<std::string>& paths)
+    {
         const auto chosen = simulated_.preferences.number("deleteDelay");
         const auto delay = chosen > 0 ? static_cast<double>(static_cast<std::uint32_t>(chosen)) : 10'800.0;
         for (const auto& path : paths) {
-            due_[path] = now() + delay;
+            if (path.starts_with("/var/mobile/Library/UserFonts/FontFiles/") ||
+                path.starts_with("/var/mobile/Library/UserFonts/FontAssets/")) {
+                due_[path] = now() + delay;
+            }
         }
+    }
+
+    void schedule()
+    {
+        const auto paths = somePaths();
+        expectScheduled(paths);
         simulated_.run(deletion_->scheduleFontFilesDeletion(paths));
+        if (flushes() == flushesBefore_) {
+            report("a recording was not flushed");
+        }
+    }
+
+    /// The daemon ends before a recording, or between it and what follows from it.
+    void scheduleAndDie()
+    {
+        const auto paths = somePaths();
+        const auto queue = simulated_.queues.createSerialQueue("the connection of a client");
+        queue->asyncForConnection(nullptr, deletion_->scheduleFontFilesDeletion(paths));
+        for (auto steps = 1 + pick(3); steps != 0; --steps) {
+            simulated_.scheduler.step();
+        }
+        if (flushes() != flushesBefore_) {
+            expectScheduled(paths);
+            expectFlushed();
+        }
+        restart();
     }
 
     void stepClock()
@@ -156,6 +202,7 @@ private:
         deletion_.reset();
         simulated_.preferences.restart();
         simulated_.drain();
+        due_ = flushed_;
         deletion_ = std::make_shared<ScheduledFontDeletion>(simulated_.platform, [] {});
         const bool hadSomething = !entries().empty();
         const auto before = passes();
@@ -173,6 +220,31 @@ private:
     std::size_t passes() const
     {
         return simulated_.log.count(LogSink::daemon, LogLevel::debug, "executeScheduledFontFilesDeletion");
+    }
+
+    std::size_t flushes() const { return simulated_.preferences.synchronizes(); }
+
+    void expectFlushed()
+    {
+        if (!isDiskFailing_) {
+            flushed_ = due_;
+        }
+    }
+
+    /// After `judge`: every writing puts everything that is in memory on the disk.
+    void judgeDisk()
+    {
+        if (flushes() != flushesBefore_) {
+            expectFlushed();
+        }
+        std::map<std::string, double> stored;
+        const auto value = simulated_.preferences.durableValue(deleteKey);
+        for (const auto& [path, date] : value ? *value->asDictionary() : PropertyList::Dictionary()) {
+            stored.emplace(path, date.asDate()->seconds);
+        }
+        if (stored != flushed_) {
+            report("the schedule on the disk is not the one that was flushed");
+        }
     }
 
     void expectNothingDue()
@@ -235,6 +307,10 @@ private:
     /// The files of the trees that are there, and when each scheduled path is due.
     std::set<std::string> present_;
     std::map<std::string, double> due_;
+    /// What a restarted daemon finds of that.
+    std::map<std::string, double> flushed_;
+    bool isDiskFailing_ = false;
+    std::size_t flushesBefore_ = 0;
     std::vector<std::string> violations_;
 };
 
