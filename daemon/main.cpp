@@ -26,17 +26,16 @@
 #include "platform/linux/memory_file.h"
 #include "platform/linux/process_inspection.h"
 #include "platform/linux/process_limits.h"
+#include "platform/linux/program_options.h"
 #include "platform/linux/sandbox_instances.h"
 #include "platform/linux/sandboxes_service.h"
 #include "platform/linux/session_agent_service.h"
 #include "platform/linux/session_agents.h"
 #include "platform/linux/signature_store.h"
 
-#include <filesystem>
 #include <random>
 #include <string>
 
-#include <CLI/CLI.hpp>
 #include <unistd.h>
 
 // The composition root: the one place that knows the services of Linux. It builds them, hands them to the
@@ -47,9 +46,7 @@ namespace typhon {
 
 namespace {
 
-struct Options {
-    std::string root;
-    LogLevel logLevel = LogLevel::defaultLevel;
+struct Options : ProgramOptions {
     bool isInternalBuild = false;
 };
 
@@ -106,23 +103,10 @@ Options parsed(int argc, char** argv)
     CLI::App app{
         "Per-application font access: decides which user-installed fonts a program may see and read."};
     app.name("typhond");
-    app.add_option("--root", options.root, "Put every path of the system under this folder")
-        ->type_name("DIR");
-    app.add_option_function<std::string>(
-           "--log-level", [&](const std::string& level) { options.logLevel = *logLevelFromName(level); },
-           "Least level that is logged")
-        ->type_name("LEVEL")
-        ->check(CLI::IsMember({"debug", "default", "error"}));
+    addProgramOptions(app, options);
     app.add_flag("--internal-build", options.isInternalBuild,
                  "Behave as on an internal build of the system, where scheduled deletions come sooner");
-    try {
-        app.parse(argc, argv);
-    } catch (const CLI::ParseError& error) {
-        std::exit(app.exit(error) == 0 ? 0 : 2);
-    }
-    if (!options.root.empty()) {
-        options.root = std::filesystem::absolute(options.root).lexically_normal().string();
-    }
+    parseProgramOptions(app, argc, argv, options);
     return options;
 }
 

@@ -11,6 +11,7 @@
 #include "platform/linux/linux_log.h"
 #include "platform/linux/linux_work_queues.h"
 #include "platform/linux/process_limits.h"
+#include "platform/linux/program_options.h"
 #include "platform/linux/service_user.h"
 
 #include <array>
@@ -20,7 +21,6 @@
 #include <memory>
 #include <string>
 
-#include <CLI/CLI.hpp>
 #include <systemd/sd-daemon.h>
 #include <unistd.h>
 
@@ -32,9 +32,7 @@ namespace typhon {
 
 namespace {
 
-struct Options {
-    std::string root;
-    LogLevel logLevel = LogLevel::defaultLevel;
+struct Options : ProgramOptions {
     long idleSeconds = 60;
 };
 
@@ -65,26 +63,13 @@ Options parsed(int argc, char** argv)
     Options options;
     CLI::App app{"Installs and removes fonts for the programs that may not write to the font directories."};
     app.name("typhon-fontmanagerd");
-    app.add_option("--root", options.root, "Put every path of the system under this folder")
-        ->type_name("DIR");
-    app.add_option_function<std::string>(
-           "--log-level", [&](const std::string& level) { options.logLevel = *logLevelFromName(level); },
-           "Least level that is logged")
-        ->type_name("LEVEL")
-        ->check(CLI::IsMember({"debug", "default", "error"}));
+    addProgramOptions(app, options);
     app.add_option(
            "--idle", options.idleSeconds,
            "End after this long without a connection, where the service manager or no font daemon runs")
         ->type_name("SECONDS")
         ->check(CLI::Range(1L, 86400L));
-    try {
-        app.parse(argc, argv);
-    } catch (const CLI::ParseError& error) {
-        std::exit(app.exit(error) == 0 ? 0 : 2);
-    }
-    if (!options.root.empty()) {
-        options.root = std::filesystem::absolute(options.root).lexically_normal().string();
-    }
+    parseProgramOptions(app, argc, argv, options);
     return options;
 }
 

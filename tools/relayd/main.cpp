@@ -1,6 +1,7 @@
 #include "platform/linux/event_pool.h"
 #include "platform/linux/linux_log.h"
 #include "platform/linux/linux_work_queues.h"
+#include "platform/linux/program_options.h"
 #include "platform/linux/root_directory.h"
 #include "platform/linux/system_bus.h"
 #include "tools/relayd/application_watch.h"
@@ -11,13 +12,9 @@
 #include <csignal>
 #include <cstddef>
 #include <cstdint>
-#include <cstdlib>
-#include <filesystem>
 #include <memory>
 #include <string>
 #include <vector>
-
-#include <CLI/CLI.hpp>
 
 // Nothing here is ever torn down: the process runs until the system stops it. Without a bus it waits for one.
 
@@ -25,9 +22,7 @@ namespace typhon {
 
 namespace {
 
-struct Options {
-    std::string root;
-    LogLevel logLevel = LogLevel::defaultLevel;
+struct Options : ProgramOptions {
     double removalWindow = 10;
 };
 
@@ -36,26 +31,13 @@ Options parsed(int argc, char** argv)
     Options options;
     CLI::App app{"Announces the system's notifications on the system bus, and the removal of applications."};
     app.name("typhon-relayd");
-    app.add_option("--root", options.root, "Put every path of the system under this folder")
-        ->type_name("DIR");
-    app.add_option_function<std::string>(
-           "--log-level", [&](const std::string& level) { options.logLevel = *logLevelFromName(level); },
-           "Least level that is logged")
-        ->type_name("LEVEL")
-        ->check(CLI::IsMember({"debug", "default", "error"}));
+    addProgramOptions(app, options);
     app.add_option("--removal-window", options.removalWindow,
                    "Seconds for which an application's desktop entry may be missing, as in an upgrade")
         ->type_name("SECONDS")
         ->check(CLI::Range(0.0, 3600.0))
         ->capture_default_str();
-    try {
-        app.parse(argc, argv);
-    } catch (const CLI::ParseError& error) {
-        std::exit(app.exit(error) == 0 ? 0 : 2);
-    }
-    if (!options.root.empty()) {
-        options.root = std::filesystem::absolute(options.root).lexically_normal().string();
-    }
+    parseProgramOptions(app, argc, argv, options);
     return options;
 }
 
