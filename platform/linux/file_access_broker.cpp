@@ -2,6 +2,7 @@
 
 #include "platform/linux/bus_message.h"
 #include "platform/linux/process_inspection.h"
+#include "platform/linux/service_object.h"
 
 #include <string>
 
@@ -17,42 +18,26 @@ IpcError denied(const char* why)
     return {ipc_errors::accessDenied, why};
 }
 
-/// Answers the calls of one connection. A connection may outlive the service by a moment.
-class FileAccessObject : public ExportedObject {
-public:
-    explicit FileAccessObject(std::weak_ptr<FileAccessBroker> broker) : broker_(std::move(broker)) {}
-
-    Task<void> handle(std::shared_ptr<IncomingCall> call) override
-    {
-        answer(*call);
-        co_return;
+void answer(FileAccessBroker* broker, IncomingCall& call)
+{
+    const auto* token = std::get_if<PropertyList>(&call.arguments().at(0));
+    const auto* path = std::get_if<PropertyList>(&call.arguments().at(1));
+    if (broker == nullptr || token == nullptr || path == nullptr || token->asData() == nullptr ||
+        path->asString() == nullptr) {
+        call.fail({ipc_errors::invalidArguments, "open takes a token and a path"});
+        return;
     }
-
-private:
-    void answer(IncomingCall& call)
-    {
-        const auto broker = broker_.lock();
-        const auto* token = std::get_if<PropertyList>(&call.arguments().at(0));
-        const auto* path = std::get_if<PropertyList>(&call.arguments().at(1));
-        if (!broker || token == nullptr || path == nullptr || token->asData() == nullptr ||
-            path->asString() == nullptr) {
-            call.fail({ipc_errors::invalidArguments, "open takes a token and a path"});
-            return;
-        }
-        const auto& bytes = token->asData()->bytes;
-        const std::string text(bytes.begin(), bytes.end());
-        auto opening = broker->open(currentAuditToken(), text, *path->asString());
-        if (!opening.file) {
-            call.fail(std::move(opening.error));
-            return;
-        }
-        const std::shared_ptr<TransferredFile> file =
-            std::make_shared<LinuxTransferredFile>(std::move(opening.file));
-        call.reply({Argument(file)});
+    const auto& bytes = token->asData()->bytes;
+    const std::string text(bytes.begin(), bytes.end());
+    auto opening = broker->open(currentAuditToken(), text, *path->asString());
+    if (!opening.file) {
+        call.fail(std::move(opening.error));
+        return;
     }
-
-    std::weak_ptr<FileAccessBroker> broker_;
-};
+    const std::shared_ptr<TransferredFile> file =
+        std::make_shared<LinuxTransferredFile>(std::move(opening.file));
+    call.reply({Argument(file)});
+}
 
 }  // namespace
 
@@ -102,9 +87,7 @@ FileAccessBroker::Opening FileAccessBroker::open(const AuditToken& bearer, std::
 
 bool FileAccessBroker::listener(Listener&, std::shared_ptr<Connection> shouldAcceptNewConnection)
 {
-    shouldAcceptNewConnection->setExportedInterfaces(interfaces());
-    shouldAcceptNewConnection->setExportedObject(std::make_shared<FileAccessObject>(weak_from_this()));
-    shouldAcceptNewConnection->resume();
+    accept(*shouldAcceptNewConnection, weak_from_this(), answer);
     return true;
 }
 
@@ -117,10 +100,7 @@ InterfaceDescriptions FileAccessBroker::interfaces()
 
 std::shared_ptr<Listener> startFileAccessService(Ipc& ipc, const std::shared_ptr<FileAccessBroker>& broker)
 {
-    auto listener = ipc.listenerForService(FileAccessBroker::serviceName);
-    listener->setDelegate(broker);
-    listener->resume();
-    return listener;
+    return startService(ipc, broker);
 }
 
 }  // namespace typhon

@@ -3,6 +3,7 @@
 #include "platform/linux/audit_tokens.h"
 #include "platform/linux/bus_message.h"
 #include "platform/linux/pidfd.h"
+#include "platform/linux/service_object.h"
 #include "platform/linux/service_user.h"
 
 #include <string>
@@ -19,40 +20,23 @@ namespace {
 
 constexpr const char* helperIdentifier = "com.vorlan.Typhon.UserFontManager";
 
-/// Answers the calls of one connection. A connection may outlive the service by a moment.
-class IdentitiesObject : public ExportedObject {
-public:
-    explicit IdentitiesObject(std::weak_ptr<IdentitiesService> service) : service_(std::move(service)) {}
-
-    Task<void> handle(std::shared_ptr<IncomingCall> call) override
-    {
-        answer(*call);
-        co_return;
+void answer(IdentitiesService* service, IncomingCall& call)
+{
+    const auto* file = std::get_if<std::shared_ptr<TransferredFile>>(&call.arguments().at(0));
+    const auto* process = file == nullptr ? nullptr : dynamic_cast<const LinuxTransferredFile*>(file->get());
+    if (service == nullptr || process == nullptr) {
+        call.fail({ipc_errors::invalidArguments, "identify takes a pidfd"});
+        return;
     }
-
-private:
-    void answer(IncomingCall& call)
-    {
-        const auto service = service_.lock();
-        const auto* file = std::get_if<std::shared_ptr<TransferredFile>>(&call.arguments().at(0));
-        const auto* process =
-            file == nullptr ? nullptr : dynamic_cast<const LinuxTransferredFile*>(file->get());
-        if (!service || process == nullptr) {
-            call.fail({ipc_errors::invalidArguments, "identify takes a pidfd"});
-            return;
-        }
-        auto outcome = service->identify(currentAuditToken(), process->descriptor.get());
-        if (auto* error = std::get_if<IpcError>(&outcome)) {
-            call.fail(std::move(*error));
-        } else {
-            Arguments results;
-            results.emplace_back(std::get<PropertyList>(std::move(outcome)));
-            call.reply(std::move(results));
-        }
+    auto outcome = service->identify(currentAuditToken(), process->descriptor.get());
+    if (auto* error = std::get_if<IpcError>(&outcome)) {
+        call.fail(std::move(*error));
+    } else {
+        Arguments results;
+        results.emplace_back(std::get<PropertyList>(std::move(outcome)));
+        call.reply(std::move(results));
     }
-
-    std::weak_ptr<IdentitiesService> service_;
-};
+}
 
 }  // namespace
 
@@ -94,9 +78,7 @@ std::variant<PropertyList, IpcError> IdentitiesService::identify(const AuditToke
 
 bool IdentitiesService::listener(Listener&, std::shared_ptr<Connection> shouldAcceptNewConnection)
 {
-    shouldAcceptNewConnection->setExportedInterfaces(interfaces());
-    shouldAcceptNewConnection->setExportedObject(std::make_shared<IdentitiesObject>(weak_from_this()));
-    shouldAcceptNewConnection->resume();
+    accept(*shouldAcceptNewConnection, weak_from_this(), answer);
     return true;
 }
 
@@ -109,10 +91,7 @@ InterfaceDescriptions IdentitiesService::interfaces()
 
 std::shared_ptr<Listener> startIdentitiesService(Ipc& ipc, const std::shared_ptr<IdentitiesService>& service)
 {
-    auto listener = ipc.listenerForService(IdentitiesService::serviceName);
-    listener->setDelegate(service);
-    listener->resume();
-    return listener;
+    return startService(ipc, service);
 }
 
 }  // namespace typhon

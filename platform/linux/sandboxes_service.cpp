@@ -1,6 +1,7 @@
 #include "platform/linux/sandboxes_service.h"
 
 #include "platform/linux/bus_message.h"
+#include "platform/linux/service_object.h"
 
 #include <string>
 
@@ -16,38 +17,22 @@ const LinuxTransferredFile* fileOf(const Argument& argument)
     return file != nullptr ? dynamic_cast<const LinuxTransferredFile*>(file->get()) : nullptr;
 }
 
-/// Answers the calls of one connection. A connection may outlive the service by a moment.
-class SandboxesObject : public ExportedObject {
-public:
-    explicit SandboxesObject(std::weak_ptr<SandboxesService> service) : service_(std::move(service)) {}
-
-    Task<void> handle(std::shared_ptr<IncomingCall> call) override
-    {
-        answer(*call);
-        co_return;
+void answer(SandboxesService* service, IncomingCall& call)
+{
+    const auto* firstProcess = fileOf(call.arguments().at(0));
+    const auto* executable = fileOf(call.arguments().at(1));
+    if (service == nullptr || firstProcess == nullptr || executable == nullptr) {
+        call.fail({ipc_errors::invalidArguments, "register takes a pidfd and an executable"});
+        return;
     }
-
-private:
-    void answer(IncomingCall& call)
-    {
-        const auto service = service_.lock();
-        const auto* firstProcess = fileOf(call.arguments().at(0));
-        const auto* executable = fileOf(call.arguments().at(1));
-        if (!service || firstProcess == nullptr || executable == nullptr) {
-            call.fail({ipc_errors::invalidArguments, "register takes a pidfd and an executable"});
-            return;
-        }
-        auto error = service->registerSandbox(currentAuditToken(), firstProcess->descriptor.get(),
-                                              executable->descriptor.get());
-        if (error) {
-            call.fail(std::move(*error));
-        } else {
-            call.reply({});
-        }
+    auto error = service->registerSandbox(currentAuditToken(), firstProcess->descriptor.get(),
+                                          executable->descriptor.get());
+    if (error) {
+        call.fail(std::move(*error));
+    } else {
+        call.reply({});
     }
-
-    std::weak_ptr<SandboxesService> service_;
-};
+}
 
 const char* errorNameOf(SandboxInstances::Refusal refusal)
 {
@@ -82,9 +67,7 @@ std::optional<IpcError> SandboxesService::registerSandbox(const AuditToken& call
 
 bool SandboxesService::listener(Listener&, std::shared_ptr<Connection> shouldAcceptNewConnection)
 {
-    shouldAcceptNewConnection->setExportedInterfaces(interfaces());
-    shouldAcceptNewConnection->setExportedObject(std::make_shared<SandboxesObject>(weak_from_this()));
-    shouldAcceptNewConnection->resume();
+    accept(*shouldAcceptNewConnection, weak_from_this(), answer);
     return true;
 }
 
@@ -97,10 +80,7 @@ InterfaceDescriptions SandboxesService::interfaces()
 
 std::shared_ptr<Listener> startSandboxesService(Ipc& ipc, const std::shared_ptr<SandboxesService>& service)
 {
-    auto listener = ipc.listenerForService(SandboxesService::serviceName);
-    listener->setDelegate(service);
-    listener->resume();
-    return listener;
+    return startService(ipc, service);
 }
 
 }  // namespace typhon
