@@ -100,6 +100,26 @@ TEST_F(DeletionTimer, TheSecondBatchWaitsForTheNextStartOfTheDaemon)
     EXPECT_TRUE(scheduled().empty());
 }
 
+TEST_F(DeletionTimer, ASecondBatchThatIsNotDueWhenTheFirstOnesTimerFiresWaitsForTheNextStart)
+{
+    schedule({file(first)});
+    advance(10'000);
+    schedule({file(second)});
+    const auto fired = 10'000 + untilNextPass();
+    EXPECT_GE(fired, 13'500);
+    EXPECT_LE(fired, 16'200);
+    EXPECT_FALSE(exists(first));
+    EXPECT_TRUE(exists(second));
+    const auto left = static_cast<std::uint32_t>(20'800 - fired);
+    EXPECT_TRUE(hasLogged(LogLevel::debug, "next deletion after " + std::to_string(left) + " seconds."))
+        << simulated.log.text();
+    advance(1e6);
+    EXPECT_EQ(passes(), 1U);
+    EXPECT_TRUE(exists(second));
+    restart();
+    EXPECT_FALSE(exists(second));
+}
+
 TEST_F(DeletionTimer, ASecondBatchAloneWithinThreeMinutesOfItsDateGoesWithTheFirst)
 {
     setDelay(1000);
