@@ -20,6 +20,12 @@ bool isEntryOf(const std::set<std::string, std::less<>>& names, std::string_view
            names.contains(font_directories::nameOfDirectoryHolding(path));
 }
 
+/// False when the first is gone: no other takes its place.
+bool isSame(const std::weak_ptr<const void>& registry, const std::weak_ptr<const void>& other)
+{
+    return !registry.owner_before(other) && !other.owner_before(registry);
+}
+
 bool contains(const PropertyList::Array& array, const char* text)
 {
     return std::ranges::find(array, PropertyList(text)) != array.end();
@@ -58,18 +64,27 @@ Task<void> AssetSynchronisation::synchronizeFontAssets(std::vector<std::string> 
 
 Task<PropertyList> AssetSynchronisation::matchingEntries(std::shared_ptr<const Names> names)
 {
-    std::function<PropertyList()> match = [this, names] {
-        PropertyList::Dictionary entries;
-        const auto all = platform_.userFontManager.userFontsInfo();
-        for (const auto& [path, entry] : *all.asDictionary()) {
-            if (isEntryOf(*names, path)) {
-                entries.emplace_hint(entries.end(), path, entry);
-            }
-        }
-        return PropertyList(std::move(entries));
-    };
+    std::function<PropertyList()> match = [this, names = std::move(names)] { return entriesOf(names); };
     Task<PropertyList> matching = mainHandlerQueue_.perform(std::move(match));
     co_return co_await std::move(matching);
+}
+
+/// On `mainHandlerQueue`. Applications find the same assets and ask about them one after another: the same
+/// value again costs nothing to put together, and is encoded for all of them once.
+PropertyList AssetSynchronisation::entriesOf(const std::shared_ptr<const Names>& names)
+{
+    const auto all = platform_.userFontManager.userFontsInfo();
+    if (last_.names && isSame(last_.registry, all.identity()) && *last_.names == *names) {
+        return last_.entries;
+    }
+    PropertyList::Dictionary entries;
+    for (const auto& [path, entry] : *all.asDictionary()) {
+        if (isEntryOf(*names, path)) {
+            entries.emplace_hint(entries.end(), path, entry);
+        }
+    }
+    last_ = {all.identity(), names, std::move(entries)};
+    return last_.entries;
 }
 
 /// Ends when the completion has run. How it went is seen in what is registered then.

@@ -32,14 +32,24 @@ public:
 private:
     using Names = std::set<std::string, std::less<>>;
 
+    /// What was matched last, and against what.
+    struct Matched {
+        std::weak_ptr<const void> registry;
+        std::shared_ptr<const Names> names;
+        PropertyList entries;
+    };
+
     bool isAdmitted(const AuditToken& token);
     Task<PropertyList> matchingEntries(std::shared_ptr<const Names> names);
+    PropertyList entriesOf(const std::shared_ptr<const Names>& names);
     Task<void> synchronize();
     PropertyList answerWith(PropertyList entries, const AuditToken& token);
 
     Platform& platform_;
     PerClientFontInfo& perClientFontInfo_;
     WorkQueue& mainHandlerQueue_;
+    // Owned by mainHandlerQueue.
+    Matched last_;
 };
 
 }  // namespace typhon

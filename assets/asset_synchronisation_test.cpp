@@ -93,6 +93,24 @@ TEST_F(AssetSynchronisationTest, TwoFilesOfAnAssetCountOnce)
     EXPECT_EQ(synchronisations(), 0U);
 }
 
+TEST_F(AssetSynchronisationTest, ThoseWhoAskTheSameGetTheVeryValueUntilTheRegistryChanges)
+{
+    const auto reader = client();
+    register_(
+        {{fontAssets + "abc.asset/a.ttf", fontEntry("A")}, {fontAssets + "d.asset/d.ttf", fontEntry("D")}});
+    const auto answered = [&](Strings paths) {
+        ask(reader, std::move(paths));
+        return *answers.back().dictionary->find("fontsInfo");
+    };
+    const auto first = answered({inStore("abc.asset")});
+    EXPECT_EQ(answered({inStore("abc.asset", "other.ttf")}).asDictionary(), first.asDictionary());
+    answered({inStore("d.asset")});
+    EXPECT_EQ(paths(), Strings{fontAssets + "d.asset/d.ttf"});
+    register_({{fontAssets + "d.asset/e.ttf", fontEntry("E")}});
+    answered({inStore("d.asset")});
+    EXPECT_EQ(paths(), Strings{fontAssets + "d.asset/e.ttf"});
+}
+
 TEST_F(AssetSynchronisationTest, EntriesAreCopiedUnchanged)
 {
     const PropertyList entry = Dictionary{{"familyName", Dictionary{{"A", "A"}}}, {"disabled", true}};

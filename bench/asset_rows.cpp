@@ -101,11 +101,12 @@ void measureOneNewAsset(Report& report)
                 3});
 }
 
-RawClient::Message assetsCall(const RawClient& client, const char* interface, const char* member)
+RawClient::Message assetsCall(const RawClient& client, const char* interface, const char* member,
+                              int assets = answeredAssets)
 {
     auto call = client.newCall(interface, member);
     sd_bus_message_open_container(call.get(), 'a', "s");
-    for (int index = 0; index < answeredAssets; ++index) {
+    for (int index = 0; index < assets; ++index) {
         sd_bus_message_append(call.get(), "s", storedPath(index).c_str());
     }
     sd_bus_message_close_container(call.get());
@@ -176,6 +177,21 @@ Step asking(const RawClient& client, const char* interface, const char* member)
     return timed([&client, interface, member] { return client.send(assetsCall(client, interface, member)); });
 }
 
+/// The daemon answers the same question again with the same value; here no question is the one before.
+void measureOtherAnswers(Report& report, const RawClient& client)
+{
+    const auto& operation = wire::synchronizeFontAssets;
+    std::vector<double> measurements;
+    for (int round = 0; round < 400; ++round) {
+        measurements.push_back(timed([&] {
+            return client.send(
+                assetsCall(client, operation.interface, operation.member, answeredAssets - round % 2));
+        })());
+    }
+    report.addFigure("`synchronizeFontAssets:reply:` about other assets than the call before, of 2,000",
+                     summaryOf(std::move(measurements)));
+}
+
 void measureAnswers(Report& report)
 {
     ScratchDaemon daemon(0, {"app-usage"});
@@ -198,6 +214,7 @@ void measureAnswers(Report& report)
                 compare(asking(client, operation.interface, operation.member),
                         asking(bare, bareInterface, "assets"), {.rounds = 20, .steps = 20, .warmUp = 20}),
                 2});
+    measureOtherAnswers(report, client);
 }
 
 }  // namespace

@@ -16,6 +16,7 @@ namespace {
 
 constexpr int directories = 20'000;
 constexpr int directoriesOfOne = 100;
+constexpr unsigned settlingSeconds = 20;
 constexpr unsigned seconds = 60;
 const std::string store = "/private/var/Cargon/AssetsV2/com_vorlan_Cargon_Font7/";
 
@@ -67,7 +68,8 @@ void measureWatch(Report& report)
     none.start();
     awaitWatch(many, directories);
     awaitWatch(none, 1);
-    ::sleep(5);
+    // Memory that the start took is given back some seconds later.
+    ::sleep(settlingSeconds);
     const double manyBefore = processorSecondsOf(many.pid());
     const double noneBefore = processorSecondsOf(none.pid());
     ::sleep(seconds);
