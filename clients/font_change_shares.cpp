@@ -95,7 +95,8 @@ std::optional<Arguments> FontChangeShares::shareInUserFonts(const Recipient& rec
     return removed_;
 }
 
-/// Each font elsewhere is complained of once a change, by the first client that would have been told.
+/// Intended: a font elsewhere is complained of once a change, not once for each client that would have been
+/// told.
 const Fonts& FontChangeShares::fontsInUserDirectories()
 {
     if (!inUserDirectories_) {
