@@ -69,8 +69,8 @@ public:
     /// The value under `key` when this is a dictionary that holds it, else null. Same lifetime as above.
     const PropertyList* find(std::string_view key) const noexcept;
 
-    /// The contents of a dictionary, empty for any other kind; leaves this one empty. They are copied only when
-    /// another copy shares them.
+    /// The contents of a dictionary, empty for any other kind; leaves this one empty. They are copied only
+    /// when another copy shares them.
     Dictionary takeDictionary() &&;
 
     /// True for the boolean true, false for everything else.
