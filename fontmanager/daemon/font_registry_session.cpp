@@ -63,6 +63,15 @@ Paths pathsOf(const PropertyList& urls)
     return result;
 }
 
+void answerEmpty(const Call& call, const std::optional<std::string>& error)
+{
+    if (error) {
+        call->fail({ipc_errors::failed, *error});
+    } else {
+        call->reply({});
+    }
+}
+
 void answerCount(const Call& call, const RegistryChange& change)
 {
     Arguments results;
@@ -137,6 +146,17 @@ Task<FontRegistrySession::Permission> FontRegistrySession::permissionOf(Self sel
                                   "in com.vorlan.developer.user-fonts) and by administrators");
     }
     co_return permission;
+}
+
+Task<bool> FontRegistrySession::mayChangeEverything(Self self, AuditToken caller, Call call)
+{
+    Task<Permission> asking = permissionOf(self, caller);
+    const auto permission = co_await std::move(asking);
+    const bool isAllowed = !permission.error && permission.everybody;
+    if (!isAllowed) {
+        call->fail(permission.error.value_or(denied("that is for the daemon and administrators")));
+    }
+    co_return isAllowed;
 }
 
 Task<void> FontRegistrySession::beginRegistration(Self self, AuditToken caller, Call call)
@@ -287,10 +307,9 @@ Task<void> FontRegistrySession::enableOrDisable(Self self, AuditToken caller, Ca
 
 Task<void> FontRegistrySession::synchronizeFontProviders(Self self, AuditToken caller, Call call)
 {
-    Task<Permission> asking = permissionOf(self, caller);
-    const auto permission = co_await std::move(asking);
-    if (permission.error || !permission.everybody) {
-        call->fail(permission.error.value_or(denied("that is for the daemon and administrators")));
+    Task<bool> asking = mayChangeEverything(self, caller, call);
+    const bool isAllowed = co_await std::move(asking);
+    if (!isAllowed) {
         co_return;
     }
     std::function<RegistryChangeOutcome(FontStore&)> work = [](FontStore& store) {
@@ -298,38 +317,28 @@ Task<void> FontRegistrySession::synchronizeFontProviders(Self self, AuditToken c
     };
     Task<RegistryChangeOutcome> changing = changeInTurn(self, std::move(work));
     const auto outcome = co_await std::move(changing);
-    if (outcome.error) {
-        call->fail({ipc_errors::failed, *outcome.error});
-    } else {
-        call->reply({});
-    }
+    answerEmpty(call, outcome.error);
 }
 
 Task<void> FontRegistrySession::synchronizeProfileFonts(Self self, AuditToken caller, Call call)
 {
-    Task<Permission> asking = permissionOf(self, caller);
-    const auto permission = co_await std::move(asking);
-    if (permission.error || !permission.everybody) {
-        call->fail(permission.error.value_or(denied("that is for the daemon and administrators")));
+    Task<bool> asking = mayChangeEverything(self, caller, call);
+    const bool isAllowed = co_await std::move(asking);
+    if (!isAllowed) {
         co_return;
     }
     const auto& parts = self->service_->parts();
     auto outcome = parts.profileFonts.synchronize();
     Task<void> reporting = parts.reports.report(std::move(outcome.change), ChangeReports::Kind::profileFonts);
     co_await std::move(reporting);
-    if (outcome.error) {
-        call->fail({ipc_errors::failed, *outcome.error});
-    } else {
-        call->reply({});
-    }
+    answerEmpty(call, outcome.error);
 }
 
 Task<void> FontRegistrySession::synchronizeFontAssets(Self self, AuditToken caller, Call call)
 {
-    Task<Permission> asking = permissionOf(self, caller);
-    const auto permission = co_await std::move(asking);
-    if (permission.error || !permission.everybody) {
-        call->fail(permission.error.value_or(denied("that is for the daemon and administrators")));
+    Task<bool> asking = mayChangeEverything(self, caller, call);
+    const bool isAllowed = co_await std::move(asking);
+    if (!isAllowed) {
         co_return;
     }
     // Reads any number of fonts, and nobody else changes those.
@@ -337,11 +346,7 @@ Task<void> FontRegistrySession::synchronizeFontAssets(Self self, AuditToken call
         [&fontAssets = self->service_->parts().fontAssets](FontStore&) { return fontAssets.synchronize(); };
     Task<RegistryChangeOutcome> changing = change(self, std::move(work));
     const auto outcome = co_await std::move(changing);
-    if (outcome.error) {
-        call->fail({ipc_errors::failed, *outcome.error});
-    } else {
-        call->reply({});
-    }
+    answerEmpty(call, outcome.error);
 }
 
 Task<RegistryChangeOutcome> FontRegistrySession::change(Self self,

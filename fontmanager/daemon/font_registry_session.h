@@ -40,6 +40,8 @@ private:
         bool coversFile(const std::string& path) const;
     };
     static Task<Permission> permissionOf(Self self, AuditToken caller);
+    /// Whether the caller is the daemon or an administrator; if not, the call has failed.
+    static Task<bool> mayChangeEverything(Self self, AuditToken caller, Call call);
 
     static Task<void> beginRegistration(Self self, AuditToken caller, Call call);
     static Task<void> addFontFile(Self self, AuditToken caller, Call call);

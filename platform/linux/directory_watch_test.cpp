@@ -55,6 +55,12 @@ protected:
     void whileNothingIsRead(const std::function<void()>& change) { queue->sync(change); }
     void make(const std::string& name) const { std::filesystem::create_directory(scratch.path() + name); }
 
+    void makeWatched(const std::string& name)
+    {
+        make(name);
+        add(name);
+    }
+
     ScratchDirectory scratch;
     std::mutex mutex;
     std::condition_variable changed;
@@ -119,10 +125,8 @@ TEST_F(DirectoryWatchTest, ADirectoryThatGoesAwayAsksForARescan)
 
 TEST_F(DirectoryWatchTest, ADirectoryThatIsMovedAwayReportsNoMore)
 {
-    make("/a");
-    make("/b");
-    add("/a");
-    add("/b");
+    makeWatched("/a");
+    makeWatched("/b");
     std::filesystem::rename(scratch.real("/a"), scratch.real("/away"));
     EXPECT_TRUE(next().mustRescan);
     scratch.writeFile("/away/one", "");
@@ -146,10 +150,8 @@ TEST_F(DirectoryWatchTest, AnotherDirectoryAtThePathTakesTheOldOnesPlace)
 
 TEST_F(DirectoryWatchTest, UnwantedWatchesEnd)
 {
-    make("/a");
-    make("/b");
-    add("/a");
-    add("/b");
+    makeWatched("/a");
+    makeWatched("/b");
     queue->sync([this] { watch->keepOnly({"/b"}); });
     scratch.writeFile("/a/one", "");
     scratch.writeFile("/b/two", "");
