@@ -16,3 +16,7 @@ install(FILES packaging/systemd/typhon.sysusers DESTINATION lib/sysusers.d RENAM
 install(FILES packaging/systemd/typhon.tmpfiles DESTINATION lib/tmpfiles.d RENAME typhon.conf)
 file(GLOB autostarted CONFIGURE_DEPENDS packaging/autostart/*.desktop)
 install(FILES ${autostarted} DESTINATION ${CMAKE_INSTALL_SYSCONFDIR}/xdg/autostart)
+file(GLOB activities CONFIGURE_DEPENDS packaging/activities/*.plist)
+install(FILES ${activities} DESTINATION ${CMAKE_INSTALL_SYSCONFDIR}/typhon/activities.d)
+file(GLOB notifications CONFIGURE_DEPENDS packaging/notifications/*.plist)
+install(FILES ${notifications} DESTINATION ${CMAKE_INSTALL_SYSCONFDIR}/typhon/notifications.d)

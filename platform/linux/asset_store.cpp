@@ -85,6 +85,7 @@ AssetStore::Listing AssetStore::assets(const std::string& assetType)
     if (!store && errno != ENOENT) {
         return {{}, "cannot open the store: " + errorText(errno)};
     }
+    result.isCatalogueBroken = !listed.value && ::access(fileOfCatalogue(assetType).c_str(), F_OK) == 0;
     const auto installed = store ? listDirectory(store.get(), mostAssets) : DirectoryListing{};
     for (const auto& assetId : installed.directories) {
         if (!isValidAssetId(assetId)) {

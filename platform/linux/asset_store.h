@@ -33,6 +33,8 @@ public:
     struct Listing {
         std::vector<StoredAsset> assets;
         std::optional<std::string> error;
+        /// True when there is a catalogue, and it does not count: nobody knows what is listed.
+        bool isCatalogueBroken = false;
     };
     /// The assets of a type, by identifier. Without a catalogue that counts, every installed one is as good
     /// as listed: nothing may be removed because a catalogue is missing or broken.

@@ -88,7 +88,9 @@ public:
     std::int64_t queryMetaDataSync() override
     {
         auto listing = store_.assets(type_);
-        if (listing.error) {
+        // What is listed must not seem to be nothing because that cannot be read.
+        const bool needsCatalogue = !types_ || (*types_ & asset_return_types::listed) != 0;
+        if (listing.error || (needsCatalogue && listing.isCatalogueBroken)) {
             return 1;
         }
         for (auto& asset : listing.assets) {

@@ -3,6 +3,7 @@
 #include "platform/linux/bus_calls.h"
 #include "platform/linux/notification_names.h"
 #include "platform/linux/notification_streams.h"
+#include "platform/linux/subscribed_notifications.h"
 #include "platform/linux/system_bus.h"
 
 #include <cstdint>
@@ -35,7 +36,7 @@ void post(sd_bus* bus, const std::string& name, Log& log)
 
 LinuxNotifications::LinuxNotifications(EventPool& pool, WorkQueues& queues, Log& log,
                                        const RootDirectory& root, const TrustsUser& trusts)
-    : log_(log), streams_(std::make_shared<NotificationStreams>(trusts, log)),
+    : log_(log), root_(root), streams_(std::make_shared<NotificationStreams>(trusts, log)),
       bus_(std::make_shared<SystemBus>(pool, queues, log, root.real(systemBusSocket)))
 {}
 
@@ -49,6 +50,14 @@ void LinuxNotifications::start()
 void LinuxNotifications::setEventStreamHandler(const std::string& stream, std::shared_ptr<WorkQueue> queue,
                                                std::function<void(PropertyList event)> handler)
 {
+    if (auto names = subscribedNotifications(root_, stream)) {
+        handler = [names = *std::move(names), handler = std::move(handler)](const PropertyList& event) {
+            const auto* name = event.find(event_streams::eventName);
+            if (name != nullptr && name->asString() != nullptr && names.contains(*name->asString())) {
+                handler(event);
+            }
+        };
+    }
     if (auto* target = streams_->streamOf(stream)) {
         target->setHandler(std::move(queue), std::move(handler));
     } else {

@@ -19,7 +19,8 @@ class SystemBus;
 /// The system's notifications, as signals on the system bus (under a scratch root: the bus that listens in
 /// that folder). An event is taken from whoever owns the announcing service's name at present and runs as
 /// a trusted user, from nobody else. Without a bus nothing arrives and what is posted is
-/// dropped; the connection is made as soon as the bus is there.
+/// dropped; the connection is made as soon as the bus is there. Handlers get the notifications that the
+/// service registration subscribes them to (see `subscribedNotifications`).
 class LinuxNotifications final : public Notifications {
 public:
     /// The services outlive everything here, the work on their queues included.
@@ -36,6 +37,7 @@ public:
 
 private:
     Log& log_;
+    const RootDirectory root_;
     const std::shared_ptr<NotificationStreams> streams_;
     const std::shared_ptr<SystemBus> bus_;
 };

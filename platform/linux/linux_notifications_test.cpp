@@ -1,5 +1,6 @@
 #include "platform/linux/linux_notifications.h"
 #include "platform/linux/linux_work_queues.h"
+#include "platform/linux/subscribed_notifications.h"
 #include "platform/linux/system_bus.h"
 #include "testing/private_bus.h"
 #include "testing/scratch_folder.h"
@@ -74,6 +75,32 @@ protected:
     LinuxWorkQueues queues{pool};
     std::unique_ptr<LinuxNotifications> notifications;
 };
+
+TEST_F(LinuxNotificationsTest, OnlySubscribedNotificationsArriveWhereTheRegistrationSaysWhich)
+{
+    folder.write(subscriptionsFile, "<plist version=\"1.0\"><dict><key>com.vorlan.pingd.matching</key><array>"
+                                    "<string>probe</string><string>wanted</string><integer>1</integer>"
+                                    "</array></dict></plist>");
+    const PrivateBus bus(socket);
+    start([](uid_t) { return true; });
+    BusPeer owner(socket);
+    owner.own(service);
+    ASSERT_TRUE(waitUntilHeard(owner));
+    owner.emit(path, service, "s", "unwanted");
+    owner.emit(path, service, "s", "wanted");
+    EXPECT_TRUE(waitForName("wanted"));
+    EXPECT_EQ(soundNames(), std::vector<std::string>{"wanted"});
+}
+
+TEST_F(LinuxNotificationsTest, WithoutASoundRegistrationEveryNotificationIsSubscribed)
+{
+    EXPECT_EQ(subscribedNotifications(folder.root, "a"), std::nullopt);
+    for (const std::string contents : {"no property list", "<plist version=\"1.0\"><array/></plist>",
+                                       "<plist version=\"1.0\"><dict><key>a</key><true/></dict></plist>"}) {
+        folder.write(subscriptionsFile, contents);
+        EXPECT_EQ(subscribedNotifications(folder.root, "a"), std::nullopt) << contents;
+    }
+}
 
 TEST_F(LinuxNotificationsTest, EventsOfAnOwnerThatRunsAsTheWrongUserAreIgnored)
 {
