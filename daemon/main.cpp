@@ -70,7 +70,8 @@ struct LinuxServices {
     LinuxWorkQueues queues{pool};
     LinuxClock clock;
     LinuxPreferences preferences{root, log};
-    LinuxFileSystem fileSystem{root};
+    SlowReads slowReads{queues, log};
+    LinuxFileSystem fileSystem{root, &slowReads};
     LinuxApplicationRegistry applicationRegistry{root, log};
     LinuxUserFontManager userFontManager{root, log};
     LinuxAnalytics analytics{root, log, queues};

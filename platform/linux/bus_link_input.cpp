@@ -77,12 +77,13 @@ void BusLink::handleEvents(std::uint32_t events)
 /// Goes on reading, now or when the peer has rested enough for the time that it has taken.
 void BusLink::proceedAfter(std::chrono::nanoseconds taken, bool hasHungUp)
 {
-    const auto pause = context_->pace.rest(peer, taken, Clock::now());
+    constexpr auto none = std::chrono::nanoseconds::zero();
+    const auto pause = taken > none ? context_->pace.rest(peer, taken, Clock::now()) : none;
     const std::lock_guard lock(mutex_);
     if (ended_ || !ready_) {
         return;
     }
-    if (!inputHeld_ && pause > std::chrono::nanoseconds::zero()) {
+    if (!inputHeld_ && pause > none) {
         rest(pause);
     }
     // A peer that is gone is announced again and again; it is noticed when reading goes on.

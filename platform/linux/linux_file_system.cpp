@@ -48,6 +48,7 @@ PropertyListReading LinuxFileSystem::readPropertyList(const std::string& path)
     if (!real) {
         return failure("not an absolute path");
     }
+    const auto watched = slowReads_ != nullptr ? slowReads_->watch(path) : nullptr;
     const auto opened = openRegularFile(*real);
     if (opened.error != 0) {
         return failure(opened.errorText());

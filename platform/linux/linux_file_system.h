@@ -2,6 +2,7 @@
 
 #include "platform/file_system.h"
 #include "platform/linux/root_directory.h"
+#include "platform/linux/slow_reads.h"
 
 #include <memory>
 #include <optional>
@@ -14,7 +15,10 @@ namespace typhon {
 /// The files of this machine. Symbolic links are followed; only regular files are ever opened.
 class LinuxFileSystem final : public FileSystem {
 public:
-    explicit LinuxFileSystem(RootDirectory root) : root_(std::move(root)) {}
+    /// Reports readings of property lists that take long to `slowReads`, which outlives it, if given.
+    explicit LinuxFileSystem(RootDirectory root, const SlowReads* slowReads = nullptr)
+        : root_(std::move(root)), slowReads_(slowReads)
+    {}
 
     bool exists(const std::string& path) override;
     PropertyListReading readPropertyList(const std::string& path) override;
@@ -25,6 +29,7 @@ private:
     std::optional<std::string> realPath(const std::string& path) const;
 
     const RootDirectory root_;
+    const SlowReads* const slowReads_;
 };
 
 }  // namespace typhon

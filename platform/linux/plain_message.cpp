@@ -15,7 +15,17 @@ namespace typhon {
 namespace {
 
 enum Type : std::uint8_t { call = 1, answer = 2, error = 3, signal = 4 };
-enum Field : std::uint8_t { path = 1, interface, member, errorName, replySerial, destination, sender, types };
+enum Field : std::uint8_t {
+    path = 1,
+    interface,
+    member,
+    errorName,
+    replySerial,
+    destination,
+    sender,
+    types,
+    descriptors
+};
 
 constexpr std::size_t longestName = 255;
 constexpr unsigned deepestTypes = 16;
@@ -138,7 +148,7 @@ public:
 
 private:
     bool takeField();
-    bool takeNumber();
+    bool takeNumber(Field field);
     bool takeText(Field field);
     bool skipPadding(std::size_t alignment);
     bool has(std::size_t count) const { return count <= end_ - at_; }
@@ -189,18 +199,19 @@ bool Header::takeField()
     }
     const auto field = static_cast<Field>(message_[at_]);
     const char type = static_cast<char>(message_[at_ + 2]);
-    if (field < path || field > types || field == sender || (found_ & bit(field)) != 0 ||
-        type != "-osssussg"[field]) {
+    if (field < path || field > descriptors || field == sender || (found_ & bit(field)) != 0 ||
+        type != "-osssussgu"[field]) {
         return false;
     }
     found_ |= bit(field);
     at_ += 4;
-    return field == replySerial ? takeNumber() : takeText(field);
+    return field == replySerial || field == descriptors ? takeNumber(field) : takeText(field);
 }
 
-bool Header::takeNumber()
+/// What some say is that there are no descriptors.
+bool Header::takeNumber(Field field)
 {
-    if (!has(4) || number(at_) == 0) {
+    if (!has(4) || (number(at_) == 0) != (field == descriptors)) {
         return false;
     }
     at_ += 4;
