@@ -71,8 +71,7 @@ std::size_t recordIn(PropertyList::Dictionary& entries, const std::vector<std::s
             continue;
         }
         const auto more = storedBytes(path);
-        if (entries.size() >= DeletionSchedule::mostEntries ||
-            bytes + more > DeletionSchedule::mostBytes) {
+        if (entries.size() >= DeletionSchedule::mostEntries || bytes + more > DeletionSchedule::mostBytes) {
             ++withoutRoom;
             continue;
         }

@@ -262,7 +262,8 @@ Dictionary PropertyList::takeDictionary() &&
         return {};
     if (contents.use_count() != 1)
         return *dictionary;
-    // Another thread may only just have let go of its copy: to count up and down waits for what it still read.
+    // Another thread may only just have let go of its copy: to count up and down waits for what it still
+    // read.
     std::shared_ptr<const Contents>(contents).reset();
     return std::move(*const_cast<Dictionary*>(dictionary));
 }

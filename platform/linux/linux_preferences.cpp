@@ -8,8 +8,8 @@
 
 // Readers take the file as they find it, which its replacement as a whole makes safe. A writer locks out the
 // other writers, reads the file once more, applies its own changes key by key and replaces the file; so what
-// an administrator changed meanwhile under another key survives, and for one key the last writer wins. What it
-// wrote itself is not read again, unless somebody has touched the file since.
+// an administrator changed meanwhile under another key survives, and for one key the last writer wins. What
+// it wrote itself is not read again, unless somebody has touched the file since.
 //
 // A store that cannot be understood reads as empty. It is kept aside before the first write. One that merely
 // could not be had (no permission, no descriptors, a failing disk) is not touched: writing fails then.
