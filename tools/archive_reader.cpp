@@ -47,6 +47,18 @@ bool limit(int resource, rlim_t value)
     return ::setrlimit(static_cast<__rlimit_resource_t>(resource), &limits) == 0;
 }
 
+/// Their runtimes have locks and stacks for signals of their own.
+void allowSanitizers(SyscallFilter& filter)
+{
+    if (!isSanitized) {
+        return;
+    }
+    for (const long call : {SYS_sigaltstack, SYS_rt_sigprocmask, SYS_rt_sigaction, SYS_gettid, SYS_getpid,
+                            SYS_sched_yield, SYS_nanosleep, SYS_clock_nanosleep}) {
+        filter.allow(call);
+    }
+}
+
 bool confine(int archive, int pipe)
 {
     __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
@@ -67,6 +79,7 @@ bool confine(int archive, int pipe)
          {SYS_brk, SYS_munmap, SYS_mremap, SYS_madvise, SYS_futex, SYS_sysinfo, SYS_exit_group}) {
         filter.allow(call);
     }
+    allowSanitizers(filter);
     return isBare && isLimited && filter.installRefusing() == 0;
 }
 
