@@ -10,7 +10,10 @@ namespace {
 bool contains(const std::optional<PropertyList>& array, std::string_view text)
 {
     const auto* members = array ? array->asArray() : nullptr;
-    return members != nullptr && std::ranges::find(*members, PropertyList(text)) != members->end();
+    return members != nullptr && std::ranges::any_of(*members, [&](const PropertyList& member) {
+               const auto* string = member.asString();
+               return string != nullptr && *string == text;
+           });
 }
 
 }  // namespace

@@ -12,9 +12,8 @@ std::optional<PropertyList> issueExtensionData(Sandbox& sandbox, const AuditToke
     if (!text) {
         return std::nullopt;
     }
-    Data data{{text->begin(), text->end()}};
-    data.bytes.push_back(0);
-    return data;
+    const auto* first = text->c_str();
+    return Data{{first, first + text->size() + 1}};
 }
 
 // Entries mostly come in the order of their paths, so each belongs at the end.

@@ -22,11 +22,11 @@ namespace typhon {
 namespace {
 
 /// Under `--ro-bind / /` the root is the same directory on another mount, so the mount counts.
-std::optional<std::array<std::uint64_t, 3>> rootOf(int processDirectory)
+std::optional<std::array<std::uint64_t, 3>> identityOf(const FileDescriptor& root)
 {
     struct statx status;
     for (const unsigned mountId : {STATX_MNT_ID_UNIQUE, static_cast<unsigned>(STATX_MNT_ID)}) {
-        if (::statx(processDirectory, "root", 0, STATX_INO | mountId, &status) != 0) {
+        if (!root || ::statx(root.get(), "", AT_EMPTY_PATH, STATX_INO | mountId, &status) != 0) {
             return std::nullopt;
         }
         if ((status.stx_mask & mountId) != 0) {
@@ -64,10 +64,10 @@ bool isUnconfined(std::string_view label)
            label.find(":unconfined_t:") != std::string_view::npos || label.ends_with(":unconfined_t");
 }
 
-/// The value of a line of /proc/PID/status, or empty.
+/// The value of a line of /proc/PID/status, one of the last, or empty.
 std::string_view statusLine(std::string_view status, std::string_view name)
 {
-    const auto start = status.find(name);
+    const auto start = status.rfind(name);
     if (start == std::string_view::npos) {
         return {};
     }
@@ -77,20 +77,24 @@ std::string_view statusLine(std::string_view status, std::string_view name)
 
 }  // namespace
 
-ConfinementProbe::View ConfinementProbe::viewOf(int directory)
+ConfinementProbe::View ConfinementProbe::viewOf(int directory, const FileDescriptor& root)
 {
     return {namespaceOf(directory, "ns/mnt"), namespaceOf(directory, "ns/user"),
-            namespaceOf(directory, "ns/pid"), rootOf(directory)};
+            namespaceOf(directory, "ns/pid"), identityOf(root)};
 }
 
 ConfinementProbe::ConfinementProbe()
 {
     const FileDescriptor one(::open("/proc/1", O_PATH | O_DIRECTORY | O_CLOEXEC));
     const FileDescriptor self(::open("/proc/self", O_PATH | O_DIRECTORY | O_CLOEXEC));
-    host_ = viewOf(one.get());
+    const auto viewOfWhole = [](const FileDescriptor& process) {
+        const FileDescriptor root(::openat(process.get(), "root", O_PATH | O_DIRECTORY | O_CLOEXEC));
+        return viewOf(process.get(), root);
+    };
+    host_ = viewOfWhole(one);
     const bool isProcessOne = host_.isWhole();
     if (!isProcessOne) {
-        host_ = viewOf(self.get());
+        host_ = viewOfWhole(self);
     }
     hostProcessNamespace_ = inodeAt(isProcessOne ? one.get() : self.get(), "ns/pid");
     // Without a labelling LSM the file exists and reading it fails.
@@ -124,7 +128,7 @@ Confinement ConfinementProbe::look(const ProcessInspection& process) const
 
 Confinement ConfinementProbe::examine(const ProcessInspection& process) const
 {
-    const auto view = viewOf(process.directory());
+    const auto view = viewOf(process.directory(), *process.root());
     if (!host_.isWhole() || !view.isWhole()) {
         return {};
     }

@@ -36,7 +36,7 @@ private:
         std::optional<std::array<std::uint64_t, 3>> root;
         bool isWhole() const { return mount && user && process && root; }
     };
-    static View viewOf(int processDirectory);
+    static View viewOf(int processDirectory, const FileDescriptor& root);
     bool isRestricted(const ProcessInspection& process) const;
 
     Confinement examine(const ProcessInspection& process) const;

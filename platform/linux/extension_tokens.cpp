@@ -28,6 +28,8 @@ constexpr std::size_t targetLength = 2 * sizeof(AuditToken);
 constexpr std::size_t nonceLength = 32;
 constexpr std::size_t macLength = 2 * crypto_generichash_BYTES;
 constexpr std::size_t checkLength = 32;
+/// Of all fields but the path, and of what stands between them.
+constexpr std::size_t longestFrame = instanceLength + targetLength + nonceLength + macLength + checkLength + 6;
 
 /// The fields of a token, all of them views into its text.
 struct Fields {
@@ -68,7 +70,9 @@ std::optional<Fields> fieldsOf(std::string_view token)
 
 std::string joined(const Fields& fields)
 {
-    std::string text(heading);
+    std::string text;
+    text.reserve(heading.size() + longestFrame + fields.path.size());
+    text = heading;
     for (const auto field : {fields.instance, fields.target, fields.nonce, fields.path}) {
         text.append(field).push_back(';');
     }
@@ -141,7 +145,9 @@ std::optional<std::string> ExtensionTokens::issue(const AuditToken& target, std:
     Fields fields{instance_, targetText, nonce, {}, {}, path};
     const auto mac = macOf(fields, key_);
     fields.mac = mac;
-    std::string text(heading);
+    std::string text;
+    text.reserve(heading.size() + longestFrame + path.size());
+    text = heading;
     for (const auto field : {fields.instance, fields.target, fields.nonce, fields.mac}) {
         text.append(field).push_back(';');
     }

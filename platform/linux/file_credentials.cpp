@@ -19,15 +19,25 @@ namespace typhon {
 
 namespace {
 
-std::string_view lineOf(std::string_view status, std::string_view name)
-{
-    const auto start = status.find(name);
-    if (start == std::string_view::npos) {
-        return {};
+/// Looks for lines in the order in which the kernel writes them, so that it walks over the text once.
+class StatusLines {
+public:
+    explicit StatusLines(std::string_view status) : status_(status) {}
+
+    /// The value of a line; null when it does not follow on the last one that was asked for.
+    std::optional<std::string_view> next(std::string_view name)
+    {
+        const auto start = status_.find(name);
+        if (start == std::string_view::npos) {
+            return std::nullopt;
+        }
+        status_.remove_prefix(start + name.size());
+        return status_.substr(0, status_.find('\n'));
     }
-    const auto from = start + name.size();
-    return status.substr(from, status.find('\n', from) - from);
-}
+
+private:
+    std::string_view status_;
+};
 
 std::vector<std::uint64_t> numbersOf(std::string_view line, int base = 10)
 {
@@ -47,16 +57,17 @@ std::vector<std::uint64_t> numbersOf(std::string_view line, int base = 10)
 
 std::optional<FileCredentials> parse(std::string_view status)
 {
-    const auto users = numbersOf(lineOf(status, "\nUid:\t"));
-    const auto groupIds = numbersOf(lineOf(status, "\nGid:\t"));
-    const auto capabilities = numbersOf(lineOf(status, "\nCapEff:\t"), 16);
-    if (users.size() != 4 || groupIds.size() != 4 || capabilities.size() != 1 ||
-        status.find("\nGroups:\t") == std::string_view::npos) {
+    StatusLines lines(status);
+    const auto users = numbersOf(lines.next("\nUid:\t").value_or(""));
+    const auto groupIds = numbersOf(lines.next("\nGid:\t").value_or(""));
+    const auto groups = lines.next("\nGroups:\t");
+    const auto capabilities = numbersOf(lines.next("\nCapEff:\t").value_or(""), 16);
+    if (users.size() != 4 || groupIds.size() != 4 || capabilities.size() != 1 || !groups) {
         return std::nullopt;
     }
     FileCredentials credentials{
         static_cast<uid_t>(users[3]), static_cast<gid_t>(groupIds[3]), {}, capabilities[0] & readOverrides};
-    for (const auto group : numbersOf(lineOf(status, "\nGroups:\t"))) {
+    for (const auto group : numbersOf(*groups)) {
         credentials.groups.push_back(static_cast<gid_t>(group));
     }
     std::ranges::sort(credentials.groups);

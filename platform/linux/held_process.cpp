@@ -76,7 +76,9 @@ void keepProcess(const AuditToken& token, const std::shared_ptr<const HeldProces
 {
     auto& [mutex, processes] = kept();
     const std::lock_guard lock(mutex);
-    processes.store(keyOf(token), process);
+    if (processes.find(keyOf(token)) != process) {
+        processes.store(keyOf(token), process);
+    }
 }
 
 void releaseProcess(const AuditToken& token)

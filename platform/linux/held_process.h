@@ -23,8 +23,8 @@ struct HeldProcess {
 /// was opened now is surely the token's only once `processOfPidfd` still tells its number.
 std::shared_ptr<const HeldProcess> holdProcess(const AuditToken& token);
 
-/// Keeps the process, which is one that sends messages, for later looks. It has been seen to be that of the
-/// token.
+/// Keeps the process, which is one that sends messages, for later looks, unless it is kept. It has been seen
+/// to be that of the token.
 void keepProcess(const AuditToken& token, const std::shared_ptr<const HeldProcess>& process);
 
 /// Keeps it no longer: a connection of the process has ended, and so, most likely, has the process.

@@ -1,6 +1,6 @@
-// Deciding is cheap where it happens often: most values end within a few kilobytes and touch neither lock nor
-// cache; one that was encoded before is found by its identity, not by its contents. Only what lies between is
-// measured further, and only as far as the limit.
+// Deciding is cheap where it happens often: a container that was encoded before is found by its identity, not
+// by its contents; other values mostly end within a few kilobytes. Only what lies between is measured further,
+// and only as far as the limit.
 
 #include "platform/linux/large_values.h"
 
@@ -88,10 +88,14 @@ LargeValues& LargeValues::shared()
 
 FileDescriptor LargeValues::memoryFileFor(const PropertyList& value)
 {
-    if (Measurement(clearlySmallBytes).fits(value)) {
-        return {};
+    const bool isContainer = value.asArray() != nullptr || value.asDictionary() != nullptr;
+    auto encoding = isContainer ? encodingOf(value, false) : nullptr;
+    if (!encoding) {
+        if (Measurement(clearlySmallBytes).fits(value)) {
+            return {};
+        }
+        encoding = encodingOf(value, false);
     }
-    auto encoding = encodingOf(value, false);
     if (!encoding) {
         if (Measurement(largestInlineBytes).fits(value)) {
             return {};

@@ -1,7 +1,5 @@
 #include "platform/linux/linux_sandbox.h"
 
-#include <fcntl.h>
-
 // Whether a process may read a path is asked of the kernel itself: the path is looked up in the root
 // directory that the process has, under its credentials, and it must lead to the very file that the daemon
 // has there. A Landlock domain is not seen by this.
@@ -18,15 +16,15 @@ bool LinuxSandbox::isSandboxed(const AuditToken& token)
 std::optional<bool> LinuxSandbox::reaches(const ProcessInspection& process, const std::string& path)
 {
     const auto ours = inodeAt(AT_FDCWD, root_.real(path).c_str());
-    const FileDescriptor root(::openat(process.directory(), "root", O_PATH | O_DIRECTORY | O_CLOEXEC));
+    const auto root = process.root();
     const auto credentials = fileCredentialsOf(process, probe_.look(process).hasOwnUserNamespace);
-    if (!ours || !root || !credentials) {
+    if (!ours || !*root || !credentials) {
         return std::nullopt;
     }
     bool isReached = false;
     const bool wasAsked = credentials_.ask(*credentials, [&] {
-        isReached = readableFile(root.get(), path) == ours ||
-                    (root_.isScratch() && readableFile(root.get(), root_.real(path)) == ours);
+        isReached = (root_.isScratch() && readableFile(root->get(), root_.real(path)) == ours) ||
+                    readableFile(root->get(), path) == ours;
     });
     return wasAsked ? std::optional(isReached) : std::nullopt;
 }

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/audit_token.h"
+#include "platform/linux/file_descriptor.h"
 
 #include <memory>
 #include <optional>
@@ -22,8 +23,10 @@ struct Confinement {
 struct SeenOfProcess {
     /// The text of its /proc/PID/status.
     std::shared_ptr<const std::string> status;
+    /// Its root directory, as an `O_PATH` descriptor.
+    std::shared_ptr<const FileDescriptor> root;
     std::optional<Confinement> confinement;
-    /// It has been checked that it is the token's process in the token's program.
+    /// It has been checked, after all this was read, that it is the token's process in the token's program.
     bool isConfirmed = false;
 };
 

@@ -56,18 +56,39 @@ SeenOfProcess& ProcessInspection::seen() const
     return shared == nullptr ? seen_ : *shared;
 }
 
+/// What is read of it from now on is not confirmed yet.
+const HeldProcess& ProcessInspection::readNow() const
+{
+    seen().isConfirmed = false;
+    return *process_;
+}
+
+int ProcessInspection::directory() const
+{
+    return readNow().directory.get();
+}
+
+int ProcessInspection::pidfd() const
+{
+    return readNow().pidfd.get();
+}
+
 bool ProcessInspection::isStillTheSame() const
 {
+    if (seen().isConfirmed) {
+        return true;
+    }
     // In this order: a process that still has its number at the end had it, and that directory, since the
     // pidfd was opened.
-    const bool isSameProgram = execGeneration(token_.processIdentifier, directory()) == token_.execGeneration;
-    const auto process = isSameProgram ? processOfPidfd(pidfd()) : std::nullopt;
+    const bool isSameProgram = execGeneration(token_.processIdentifier, process_->directory.get()) == token_.execGeneration;
+    const auto process = isSameProgram ? processOfPidfd(process_->pidfd.get()) : std::nullopt;
     if (!process || process->processIdentifier != token_.processIdentifier) {
         seen() = {};
         return false;
     }
+    seen().isConfirmed = true;
     // Only of senders it is likely that somebody asks about them again.
-    if (!std::exchange(seen().isConfirmed, true) && MessageLooks::of(token_) != nullptr) {
+    if (MessageLooks::of(token_) != nullptr) {
         keepProcess(token_, process_);
     }
     return true;
@@ -83,9 +104,19 @@ std::shared_ptr<const std::string> ProcessInspection::status() const
 {
     auto& known = seen().status;
     if (!known) {
-        if (auto text = textOf(process_->status.get(), statusLimit)) {
+        if (auto text = textOf(readNow().status.get(), statusLimit)) {
             known = std::make_shared<const std::string>(*std::move(text));
         }
+    }
+    return known;
+}
+
+std::shared_ptr<const FileDescriptor> ProcessInspection::root() const
+{
+    auto& known = seen().root;
+    if (!known) {
+        known = std::make_shared<const FileDescriptor>(
+            ::openat(directory(), "root", O_PATH | O_DIRECTORY | O_CLOEXEC));
     }
     return known;
 }

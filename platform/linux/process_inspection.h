@@ -19,12 +19,15 @@ public:
     /// Null when there is no such process (any more).
     static std::optional<ProcessInspection> begin(const AuditToken& token);
 
-    /// An `O_PATH` descriptor of the process's directory in /proc. Owned by this.
-    int directory() const { return process_->directory.get(); }
-    /// Owned by this.
-    int pidfd() const { return process_->pidfd.get(); }
+    /// An `O_PATH` descriptor of the process's directory in /proc. Owned by this. Whoever asks for it reads
+    /// something new, which is to be confirmed.
+    int directory() const;
+    /// The same, and owned by this too.
+    int pidfd() const;
 
-    /// True when the process still runs the program of the token, and did so since `begin`.
+    /// True when the process still runs the program of the token, and did so since `begin`. A look that found
+    /// all it needed in what an earlier one of the same message has read is as good as that one: nothing is
+    /// asked again.
     bool isStillTheSame() const;
 
     /// A file of the process's directory, at most `limit` bytes of it; null when it cannot be read.
@@ -32,12 +35,16 @@ public:
     /// Its /proc/PID/status, as far as it is of reasonable length; null when it cannot be read. Read once for
     /// all looks of the same message.
     std::shared_ptr<const std::string> status() const;
+    /// An `O_PATH` descriptor of its root directory; none if that cannot be opened. Opened once for all looks
+    /// of the same message.
+    std::shared_ptr<const FileDescriptor> root() const;
 
     /// Where looks remember what they have seen, for the others of the same message.
     SeenOfProcess& seen() const;
 
 private:
     ProcessInspection(const AuditToken& token, std::shared_ptr<const HeldProcess> process);
+    const HeldProcess& readNow() const;
 
     AuditToken token_;
     std::shared_ptr<const HeldProcess> process_;

@@ -161,10 +161,46 @@ TEST(ProcessInspection, AnExecInTheMiddleOfAMessageIsNoticedByTheNextLook)
     ASSERT_EQ(isSandboxed(token), false);
     child.write("\n");
     ASSERT_EQ(child.read(), "2\n");
-    // Intended: nothing is read for this question, so the earlier look of the same message answers it.
+    // Intended: nothing is read for these questions, so the earlier look of the same message answers them.
     EXPECT_TRUE(isSameProcess(token));
-    EXPECT_EQ(isSandboxed(token), std::nullopt);
+    EXPECT_EQ(isSandboxed(token), false);
+    const auto readAgain = inspectProcess(
+        token, [](const ProcessInspection& process) { return process.contents("comm", 100); });
+    EXPECT_EQ(readAgain, std::nullopt);
     EXPECT_FALSE(isSameProcess(token));
+}
+
+TEST(ProcessInspection, WhatALookHasReadAndNotConfirmedIsConfirmedByTheNext)
+{
+    ChildProcess child({"/bin/sh", "-c", "echo 1; read a; exec /bin/sh -c 'echo 2; read a'"});
+    ASSERT_EQ(child.read(), "1\n");
+    const auto token = child.token();
+    const MessageLooks message;
+    ASSERT_TRUE(isSameProcess(token));
+    child.write("\n");
+    ASSERT_EQ(child.read(), "2\n");
+    {
+        const auto abandoned = ProcessInspection::begin(token);
+        ASSERT_TRUE(abandoned && abandoned->status());
+    }
+    EXPECT_FALSE(isSameProcess(token));
+}
+
+TEST(ProcessInspection, TheRootIsThatOfTheFirstLookOfAMessage)
+{
+    const ChildProcess child(testing::remain);
+    ASSERT_EQ(child.read(), "r");
+    const auto rootSeen = [&] {
+        return inspectProcess(child.token(), [](const ProcessInspection& process) {
+            return std::optional(process.root());
+        });
+    };
+    const MessageLooks message;
+    const auto first = rootSeen();
+    ASSERT_TRUE(first && **first);
+    EXPECT_EQ(rootSeen(), first);
+    const MessageLooks next;
+    EXPECT_NE(rootSeen(), first);
 }
 
 TEST(ProcessInspection, AMessageWithinAMessageHasLooksOfItsOwn)
