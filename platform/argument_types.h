@@ -2,6 +2,7 @@
 
 #include "platform/ipc.h"
 
+#include <algorithm>
 #include <cstddef>
 #include <string>
 #include <string_view>
@@ -28,7 +29,14 @@ inline std::string_view takeCompleteType(std::string_view& types)
     return first;
 }
 
-/// The described member, or null. The pointer lives as long as the descriptions.
+/// The described member, or null. The pointer lives as long as the description.
+inline const MemberDescription* findMember(const InterfaceDescription& interface, std::string_view member)
+{
+    const auto found = std::ranges::find(interface.members, member, &MemberDescription::name);
+    return found == interface.members.end() ? nullptr : &*found;
+}
+
+/// The same in any of several interfaces, by name.
 inline const MemberDescription* findMember(const InterfaceDescriptions& interfaces,
                                            std::string_view interface, std::string_view member)
 {
@@ -36,13 +44,9 @@ inline const MemberDescription* findMember(const InterfaceDescriptions& interfac
         return nullptr;
     }
     for (const auto& description : *interfaces) {
-        if (description.name != interface) {
-            continue;
-        }
-        for (const auto& candidate : description.members) {
-            if (candidate.name == member) {
-                return &candidate;
-            }
+        const auto* found = description.name == interface ? findMember(description, member) : nullptr;
+        if (found != nullptr) {
+            return found;
         }
     }
     return nullptr;

@@ -316,7 +316,7 @@ void BusLink::failLocked(std::uint64_t cookie, const IpcError& error, Afterwards
 BusMessage BusLink::callToAnswer(std::uint64_t cookie)
 {
     sd_bus_message* raw = nullptr;
-    if (sd_bus_message_new_method_call(bus_.get(), &raw, nullptr, "/", "call.to", "Answer") < 0) {
+    if (sd_bus_message_new(bus_.get(), &raw, SD_BUS_MESSAGE_METHOD_CALL) < 0) {
         return nullptr;
     }
     BusMessage call(raw);

@@ -134,7 +134,7 @@ BusLink::Next BusLink::handleInput(std::uint32_t events, Afterwards& afterwards)
         processOutput(afterwards);
     }
     const auto next = ended_ || inputHeld_ ? Next::wait : processInput(afterwards);
-    if (!ended_) {
+    if (!ended_ && !outgoing_.isEmpty()) {
         checkOutgoing(afterwards);
     }
     return ended_ ? Next::wait : next;
@@ -275,6 +275,8 @@ void BusLink::receive(sd_bus_message* message, Afterwards& afterwards)
 {
     if (isCall(message)) {
         if (const auto owner = owner_.lock()) {
+            constexpr std::size_t usualActions = 4;
+            afterwards.reserve(usualActions);
             afterwards.push_back([owner] {});
             owner->receivedCall(*this, owner->readCall(*this, message), afterwards);
         }

@@ -14,9 +14,9 @@
 //
 //   typhon-extension-1 ; class ; daemon ; target ; nonce ; MAC ; check ; path
 //
-// The MAC is keyed BLAKE2b and covers every field but itself and the check. The check is an unkeyed digest of
-// all the rest: it keeps a damaged token from being taken for one of an earlier daemon, and proves nothing
-// else.
+// The MAC is keyed BLAKE2b and covers every field but itself and the check. The check is a short digest of
+// all the rest, under a key that is no secret: it keeps a damaged token from being taken for one of an
+// earlier daemon, and proves nothing else.
 
 namespace typhon {
 
@@ -27,9 +27,10 @@ constexpr std::size_t instanceLength = 32;
 constexpr std::size_t targetLength = 2 * sizeof(AuditToken);
 constexpr std::size_t nonceLength = 32;
 constexpr std::size_t macLength = 2 * crypto_generichash_BYTES;
-constexpr std::size_t checkLength = 32;
+constexpr std::size_t checkLength = 2 * crypto_shorthash_BYTES;
 /// Of all fields but the path, and of what stands between them.
-constexpr std::size_t longestFrame = instanceLength + targetLength + nonceLength + macLength + checkLength + 6;
+constexpr std::size_t longestFrame =
+    instanceLength + targetLength + nonceLength + macLength + checkLength + 6;
 
 /// The fields of a token, all of them views into its text.
 struct Fields {
@@ -95,8 +96,9 @@ std::string macOf(const Fields& fields, const std::array<std::uint8_t, 32>& key)
 std::string checkOf(const Fields& fields)
 {
     const auto text = joined(fields).append(fields.mac);
+    constexpr std::array<std::uint8_t, crypto_shorthash_KEYBYTES> noKey{};
     std::array<std::uint8_t, checkLength / 2> digest;
-    crypto_generichash(digest.data(), digest.size(), bytesOf(text), text.size(), nullptr, 0);
+    crypto_shorthash(digest.data(), bytesOf(text), text.size(), noKey.data());
     return hexOf(digest);
 }
 

@@ -9,6 +9,9 @@
 
 #include <fcntl.h>
 #include <linux/openat2.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
 // A descriptor that was opened read-only is not enough: its holder may reopen the file for writing through
 // /proc/self/fd if the file's owner is his own user. Through a read-only mount he may not. A directory
@@ -32,7 +35,36 @@ FontFiles::Failure failureOf(int error)
     return error == ENOENT || error == ENOTDIR ? FontFiles::Failure::missing : FontFiles::Failure::refused;
 }
 
+/// Through a mount without devices, opening can neither block nor have effects.
+OpenedFile openRegularFileOfMount(const std::string& path, int mount, std::uint64_t resolve)
+{
+    open_how how{};
+    how.flags = O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY;
+    how.resolve = resolve;
+    OpenedFile opened;
+    FileDescriptor file(static_cast<int>(::syscall(SYS_openat2, mount, path.c_str(), &how, sizeof how)));
+    if (!file || ::fstat(file.get(), &opened.status) != 0 || ::fcntl(file.get(), F_SETFL, 0) != 0) {
+        opened.error = errno;
+    } else if (!S_ISREG(opened.status.st_mode)) {
+        opened.error = EINVAL;
+    } else {
+        opened.file = std::move(file);
+    }
+    return opened;
+}
+
 }  // namespace
+
+std::shared_ptr<const FontFiles::Mount> FontFiles::knownMountOf(const FontTree& tree,
+                                                                const std::string& directory)
+{
+    const auto identity = inodeAt(AT_FDCWD, directory.c_str());
+    const std::lock_guard lock(mutex_);
+    const auto known = mounts_.find(tree.path);
+    const bool isCurrent = usesMounts_ && identity && known != mounts_.end() && known->second &&
+                           known->second->tree == *identity;
+    return isCurrent ? known->second : nullptr;
+}
 
 std::shared_ptr<const FontFiles::Mount> FontFiles::mountOf(const FontTree& tree, int directory)
 {
@@ -72,14 +104,19 @@ FontFiles::Opening FontFiles::open(const std::string& path)
         return {{}, Failure::refused};
     }
     const auto treePath = root_.real(tree->path.substr(0, tree->path.size() - 1));
-    const FileDescriptor directory(::open(treePath.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    if (!directory) {
-        return {{}, failureOf(errno)};
+    auto mount = knownMountOf(*tree, treePath);
+    FileDescriptor directory;
+    if (!mount) {
+        directory = FileDescriptor(::open(treePath.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+        if (!directory) {
+            return {{}, failureOf(errno)};
+        }
+        mount = mountOf(*tree, directory.get());
     }
-    const auto mount = mountOf(*tree, directory.get());
-    const int top = mount ? mount->descriptor.get() : directory.get();
     constexpr auto beneath = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS | RESOLVE_NO_MAGICLINKS;
-    auto opened = openRegularFile(path.substr(tree->path.size()), top, beneath);
+    const auto name = path.substr(tree->path.size());
+    auto opened = mount ? openRegularFileOfMount(name, mount->descriptor.get(), beneath)
+                        : openRegularFile(name, directory.get(), beneath);
     if (opened.error != 0) {
         return {{}, failureOf(opened.error)};
     }

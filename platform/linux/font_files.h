@@ -40,6 +40,8 @@ private:
         Inode tree;
         FileDescriptor descriptor;
     };
+    /// That of the tree at `directory`, if it was made before.
+    std::shared_ptr<const Mount> knownMountOf(const FontTree& tree, const std::string& directory);
     std::shared_ptr<const Mount> mountOf(const FontTree& tree, int directory);
     void complainUnless(bool copied);
 

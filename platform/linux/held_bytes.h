@@ -56,6 +56,9 @@ private:
 
     bool take(const AuditToken& peer, std::size_t bytes)
     {
+        if (bytes == 0) {
+            return true;
+        }
         const std::lock_guard lock(mutex_);
         auto& process = processes_[keyOf(peer)];
         auto& user = users_[peer.effectiveUser];

@@ -1,6 +1,6 @@
 // Deciding is cheap where it happens often: a container that was encoded before is found by its identity, not
-// by its contents; other values mostly end within a few kilobytes. Only what lies between is measured further,
-// and only as far as the limit.
+// by its contents; other values mostly end within a few kilobytes. Only what lies between is measured
+// further, and only as far as the limit.
 
 #include "platform/linux/large_values.h"
 

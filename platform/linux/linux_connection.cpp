@@ -114,10 +114,14 @@ std::shared_ptr<BusLink> LinuxConnection::usableLink()
     if (!link) {
         return nullptr;
     }
+    Connector used;
     {
         const std::lock_guard lock(mutex_);
         if (ended_) {
             return nullptr;
+        }
+        if (lifetime_ == Lifetime::oneSocket) {
+            used.swap(connector_);
         }
         link_ = link;
         peer_ = link->peer;

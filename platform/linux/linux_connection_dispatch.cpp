@@ -41,9 +41,9 @@ void LinuxConnection::receivedCall(BusLink& link, ReceivedCall call, BusLink::Af
         return;
     }
     const LinuxIncomingCall::Origin origin{link.weak_from_this(), call.cookie, call.expectsReply};
-    auto incoming =
-        std::make_shared<LinuxIncomingCall>(origin, std::move(call.target.interface), member,
-                                            std::move(*call.reading.arguments), std::move(charge));
+    auto incoming = std::make_shared<LinuxIncomingCall>(
+        origin, LinuxIncomingCall::Operation{std::move(call.interfaces), *call.interface, member},
+        std::move(*call.reading.arguments), std::move(charge));
     enqueue([incoming](Self self) { return handleCall(self, incoming); }, afterwards);
 }
 

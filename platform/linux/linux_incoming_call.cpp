@@ -4,19 +4,19 @@
 
 namespace typhon {
 
-LinuxIncomingCall::LinuxIncomingCall(Origin origin, std::string interface, const MemberDescription& member,
-                                     Arguments arguments, std::unique_ptr<UnansweredCalls::Charge> charge)
-    : origin_(std::move(origin)), interface_(std::move(interface)), member_(member),
-      arguments_(std::move(arguments)), charge_(std::move(charge))
+LinuxIncomingCall::LinuxIncomingCall(Origin origin, Operation operation, Arguments arguments,
+                                     std::unique_ptr<UnansweredCalls::Charge> charge)
+    : origin_(std::move(origin)), operation_(std::move(operation)), arguments_(std::move(arguments)),
+      charge_(std::move(charge))
 {}
 
 void LinuxIncomingCall::reply(Arguments results)
 {
-    if (!member_.replies) {
+    if (!operation_.member.replies) {
         return;
     }
     if (const auto link = takeAnswer()) {
-        link->reply(origin_.cookie, member_.outTypes, results, member_.name);
+        link->reply(origin_.cookie, operation_.member.outTypes, results, operation_.member.name);
     }
 }
 
@@ -30,7 +30,7 @@ void LinuxIncomingCall::fail(IpcError error)
 void LinuxIncomingCall::handled()
 {
     const std::lock_guard lock(mutex_);
-    if (!member_.replies || !origin_.replyExpected) {
+    if (!operation_.member.replies || !origin_.replyExpected) {
         charge_.reset();
     }
 }

@@ -19,11 +19,17 @@ public:
         std::uint64_t cookie;
         bool replyExpected;
     };
-    LinuxIncomingCall(Origin origin, std::string interface, const MemberDescription& member,
-                      Arguments arguments, std::unique_ptr<UnansweredCalls::Charge> charge);
+    /// What is called, among the interfaces that were exported when the call came.
+    struct Operation {
+        InterfaceDescriptions exported;
+        const InterfaceDescription& interface;
+        const MemberDescription& member;
+    };
+    LinuxIncomingCall(Origin origin, Operation operation, Arguments arguments,
+                      std::unique_ptr<UnansweredCalls::Charge> charge);
 
-    const std::string& interface() const override { return interface_; }
-    const std::string& member() const override { return member_.name; }
+    const std::string& interface() const override { return operation_.interface.name; }
+    const std::string& member() const override { return operation_.member.name; }
     const Arguments& arguments() const override { return arguments_; }
     bool isReplyExpected() const override { return origin_.replyExpected; }
     void reply(Arguments results) override;
@@ -37,8 +43,7 @@ private:
     std::shared_ptr<BusLink> takeAnswer();
 
     const Origin origin_;
-    const std::string interface_;
-    const MemberDescription member_;
+    const Operation operation_;
     const Arguments arguments_;
     std::mutex mutex_;
     std::unique_ptr<UnansweredCalls::Charge> charge_;

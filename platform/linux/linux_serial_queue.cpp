@@ -9,6 +9,7 @@
 #include "platform/linux/linux_serial_queue.h"
 
 #include <future>
+#include <set>
 #include <utility>
 
 namespace typhon {
@@ -18,10 +19,19 @@ namespace {
 /// So many slices run in one go before other work of the pool gets its turn.
 constexpr int slicesAtOnce = 32;
 
+/// Kept for good: there are as many labels as places in the code that make queues.
+const std::string& keptLabel(std::string label)
+{
+    static std::mutex mutex;
+    static auto& labels = *new std::set<std::string>;
+    const std::lock_guard lock(mutex);
+    return *labels.insert(std::move(label)).first;
+}
+
 }  // namespace
 
 LinuxSerialQueue::LinuxSerialQueue(std::string label, std::shared_ptr<Executor> executor)
-    : label_(std::move(label)), executor_(std::move(executor))
+    : label_(keptLabel(std::move(label))), executor_(std::move(executor))
 {}
 
 void LinuxSerialQueue::start(Task<void> body, WorkItem* awaitedBy, std::shared_ptr<void> connection)
@@ -83,14 +93,25 @@ void LinuxSerialQueue::waitForTurn(Lock& lock, const std::shared_ptr<LinuxWorkIt
 {
     const bool canHelp = executor_->isCurrentThread();
     ++waitingThreads_;
+    if (!turn_) {
+        turn_ = std::make_unique<std::condition_variable>();
+    }
     while (running_ != item && !closed_) {
         if (canHelp && ready_ && !sliceRuns_) {
             runSlice(lock);
         } else {
-            turn_.wait(lock);
+            turn_->wait(lock);
         }
     }
     --waitingThreads_;
+}
+
+/// The caller holds the mutex.
+void LinuxSerialQueue::wakeWaiting()
+{
+    if (turn_) {
+        turn_->notify_all();
+    }
 }
 
 void LinuxSerialQueue::continueItem(const std::shared_ptr<LinuxWorkItem>& item,
@@ -122,7 +143,7 @@ void LinuxSerialQueue::itemEnded(LinuxWorkItem& item)
     if (ready_) {
         announceIfReady(lock);
     } else {
-        turn_.notify_all();
+        wakeWaiting();
         lock.unlock();
     }
 }
@@ -134,7 +155,7 @@ void LinuxSerialQueue::close()
     ready_ = nullptr;
     const auto running = std::exchange(running_, nullptr);
     const auto waiting = std::exchange(waiting_, {});
-    turn_.notify_all();
+    wakeWaiting();
     lock.unlock();
 }
 
@@ -165,7 +186,7 @@ void LinuxSerialQueue::announceIfReady(Lock& lock)
 {
     const bool needed = ready_ && !sliceRuns_;
     if (needed && waitingThreads_ > 0) {
-        turn_.notify_all();
+        wakeWaiting();
     }
     lock.unlock();
     if (!needed) {

@@ -35,13 +35,16 @@ private:
     void runSlice(Lock& lock);
     void runSlices();
     void announceIfReady(Lock& lock);
+    void wakeWaiting();
 
-    const std::string label_;
+    /// One text for all queues of the same name: every connection has one.
+    const std::string& label_;
     const std::shared_ptr<Executor> executor_;
 
     std::mutex mutex_;
     // All below is protected by mutex_.
-    std::condition_variable turn_;
+    /// Made for the first thread that waits.
+    std::unique_ptr<std::condition_variable> turn_;
     unsigned waitingThreads_ = 0;
     std::shared_ptr<LinuxWorkItem> running_;
     /// A list, which costs nothing while it is empty: most queues belong to idle connections.

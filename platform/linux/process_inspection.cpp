@@ -80,7 +80,8 @@ bool ProcessInspection::isStillTheSame() const
     }
     // In this order: a process that still has its number at the end had it, and that directory, since the
     // pidfd was opened.
-    const bool isSameProgram = execGeneration(token_.processIdentifier, process_->directory.get()) == token_.execGeneration;
+    const bool isSameProgram =
+        execGeneration(token_.processIdentifier, process_->directory.get()) == token_.execGeneration;
     const auto process = isSameProgram ? processOfPidfd(process_->pidfd.get()) : std::nullopt;
     if (!process || process->processIdentifier != token_.processIdentifier) {
         seen() = {};

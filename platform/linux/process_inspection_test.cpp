@@ -164,8 +164,8 @@ TEST(ProcessInspection, AnExecInTheMiddleOfAMessageIsNoticedByTheNextLook)
     // Intended: nothing is read for these questions, so the earlier look of the same message answers them.
     EXPECT_TRUE(isSameProcess(token));
     EXPECT_EQ(isSandboxed(token), false);
-    const auto readAgain = inspectProcess(
-        token, [](const ProcessInspection& process) { return process.contents("comm", 100); });
+    const auto readAgain =
+        inspectProcess(token, [](const ProcessInspection& process) { return process.contents("comm", 100); });
     EXPECT_EQ(readAgain, std::nullopt);
     EXPECT_FALSE(isSameProcess(token));
 }
@@ -191,9 +191,8 @@ TEST(ProcessInspection, TheRootIsThatOfTheFirstLookOfAMessage)
     const ChildProcess child(testing::remain);
     ASSERT_EQ(child.read(), "r");
     const auto rootSeen = [&] {
-        return inspectProcess(child.token(), [](const ProcessInspection& process) {
-            return std::optional(process.root());
-        });
+        return inspectProcess(child.token(),
+                              [](const ProcessInspection& process) { return std::optional(process.root()); });
     };
     const MessageLooks message;
     const auto first = rootSeen();

@@ -3,6 +3,8 @@
 #include "platform/argument_types.h"
 #include "platform/linux/introspection.h"
 
+#include <algorithm>
+#include <string_view>
 #include <utility>
 
 namespace typhon {
@@ -20,18 +22,25 @@ CallTarget targetOf(sd_bus_message* call)
             orEmpty(sd_bus_message_get_member(call))};
 }
 
-/// A caller may leave the interface out: then it is the first that has such a member.
-void completeInterface(CallTarget& target, const InterfaceDescriptions& interfaces)
+std::string_view viewOf(const char* text)
 {
-    if (!target.interface.empty() || !interfaces) {
-        return;
+    return text == nullptr ? std::string_view() : std::string_view(text);
+}
+
+/// The interface that is called; null when there is none. A caller may leave it out: then it is the first
+/// that has such a member.
+const InterfaceDescription* interfaceOf(sd_bus_message* call, const InterfaceDescriptions& interfaces)
+{
+    const auto name = viewOf(sd_bus_message_get_interface(call));
+    const auto member = viewOf(sd_bus_message_get_member(call));
+    const auto isCalled = [&](const InterfaceDescription& interface) {
+        return name.empty() ? findMember(interface, member) != nullptr : interface.name == name;
+    };
+    if (!interfaces) {
+        return nullptr;
     }
-    for (const auto& interface : *interfaces) {
-        if (findMember(interfaces, interface.name, target.member) != nullptr) {
-            target.interface = interface.name;
-            return;
-        }
-    }
+    const auto found = std::ranges::find_if(*interfaces, isCalled);
+    return found == interfaces->end() ? nullptr : &*found;
 }
 
 /// The next argument, if it is a string.
@@ -50,16 +59,19 @@ ReceivedCall readReceivedCall(sd_bus_message* call, InterfaceDescriptions interf
                               const AuditToken& sender, const MessageLimits& limits)
 {
     ReceivedCall result;
-    result.target = targetOf(call);
     sd_bus_message_get_cookie(call, &result.cookie);
     result.expectsReply = sd_bus_message_get_expect_reply(call) > 0;
-    completeInterface(result.target, interfaces);
-    if (result.target.path == exportedObjectPath) {
-        result.member = findMember(interfaces, result.target.interface, result.target.member);
+    result.interface = interfaceOf(call, interfaces);
+    if (result.interface != nullptr && viewOf(sd_bus_message_get_path(call)) == exportedObjectPath) {
+        result.member = findMember(*result.interface, viewOf(sd_bus_message_get_member(call)));
     }
     if (result.member != nullptr) {
         result.reading = readMessage(call, result.member->inTypes, sender, limits);
     } else {
+        result.target = targetOf(call);
+        if (result.interface != nullptr) {
+            result.target.interface = result.interface->name;
+        }
         result.signature = orEmpty(sd_bus_message_get_signature(call, 1));
         result.firstText = nextText(call);
         result.secondText = nextText(call);

@@ -13,16 +13,18 @@ namespace typhon {
 
 /// All that a call says, read from its message.
 struct ReceivedCall {
-    CallTarget target;
     std::uint64_t cookie = 0;
     bool expectsReply = false;
-    /// Where `member` stands.
+    /// Where `interface` and `member` stand.
     InterfaceDescriptions interfaces;
     /// Null when no described member takes the call.
     const MemberDescription* member = nullptr;
     /// Of the member.
+    const InterfaceDescription* interface = nullptr;
+    /// Of the member.
     MessageReading reading;
-    // Of a call that no member takes: its signature, and its first arguments as far as they are strings.
+    // Of a call that no member takes: its target, its signature, and its first arguments as far as they are strings.
+    CallTarget target;
     std::string signature;
     std::string firstText;
     std::string secondText;
