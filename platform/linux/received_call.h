@@ -23,7 +23,8 @@ struct ReceivedCall {
     const InterfaceDescription* interface = nullptr;
     /// Of the member.
     MessageReading reading;
-    // Of a call that no member takes: its target, its signature, and its first arguments as far as they are strings.
+    // Of a call that no member takes: its target, its signature, and its first arguments as far as they are
+    // strings.
     CallTarget target;
     std::string signature;
     std::string firstText;
