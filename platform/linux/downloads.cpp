@@ -116,7 +116,7 @@ public:
             const std::lock_guard lock(mutex_);
             auto& line = discretionary ? patient_ : urgent_;
             if (!isClosed_ && line.size() < mostWaiting) {
-                line.emplace_back(request, std::move(then));
+                line.push_back({request, std::move(then)});
                 then = nullptr;
             }
         }
