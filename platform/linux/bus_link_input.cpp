@@ -134,7 +134,7 @@ BusLink::Next BusLink::handleInput(std::uint32_t events, Afterwards& afterwards)
         processOutput(afterwards);
     }
     const auto next = ended_ || inputHeld_ ? Next::wait : processInput(afterwards);
-    if (!ended_ && !outgoing_.isEmpty()) {
+    if (!ended_) {
         checkOutgoing(afterwards);
     }
     return ended_ ? Next::wait : next;
