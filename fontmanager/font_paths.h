@@ -14,6 +14,8 @@ inline constexpr const char* fontFiles = "/var/mobile/Library/UserFonts/FontFile
 inline constexpr const char* registry = "/var/mobile/Library/UserFonts/UserFonts.plist";
 /// What a change that was interrupted still has to do.
 inline constexpr const char* journal = "/var/mobile/Library/UserFonts/UserFonts.plist.pending";
+/// There while the registry may have been replaced without anybody hearing of it.
+inline constexpr const char* unreported = "/var/mobile/Library/UserFonts/UserFonts.plist.unreported";
 /// Held by the one process that changes fonts.
 inline constexpr const char* writerLock = "/var/mobile/Library/UserFonts/UserFonts.plist.writer";
 /// Fonts that came with a profile, put there by whoever installs profiles.

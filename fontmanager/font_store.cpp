@@ -81,7 +81,9 @@ RegistryChangeOutcome FontStore::open()
     if (lock_->error()) {
         return {.change = {}, .error = *lock_->error() + "; another process changes the fonts already"};
     }
+    const bool isUnreported = registry_.isUnreported();
     auto outcome = completeInterruptedChange();
+    outcome.change.isRegistryChanged = outcome.change.isRegistryChanged || isUnreported;
     if (!outcome.error) {
         sweepCopies();
     }
@@ -227,6 +229,7 @@ RegistryChangeOutcome FontStore::synchronizeProviders()
 void FontStore::changeWasReported()
 {
     const std::lock_guard lock(mutex_);
+    registry_.wasReported();
     if (const auto error = eraseCompletedChange()) {
         TYLog_Error(log_, *error);
     }

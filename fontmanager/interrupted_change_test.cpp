@@ -62,6 +62,16 @@ TEST_F(InterruptedChangeTest, CopiesThatNobodyDecidedOnAreSwept)
     EXPECT_EQ(registry(), PropertyList());
 }
 
+TEST_F(InterruptedChangeTest, ARegistryOfWhichNobodyHeardIsReportedByTheNextRunAndOnlyByThat)
+{
+    registerOld();
+    const auto change = nextRun().change;
+    EXPECT_TRUE(change.isRegistryChanged);
+    EXPECT_THAT(change.available, IsEmpty());
+    EXPECT_FALSE(nextRun().change.isRegistryChanged);
+    EXPECT_FALSE(std::filesystem::exists(root.real(font_paths::unreported)));
+}
+
 TEST_F(InterruptedChangeTest, ADirectoryWithNothingButCopiesGoesWithThem)
 {
     std::filesystem::remove(root.real(directory + "/old.ttf"));
@@ -170,7 +180,9 @@ TEST_F(InterruptedChangeTest, OneThatWasNotReportedIsNotDoneAgainOverALaterChang
         ASSERT_EQ(store.commit(*begun.registration).error, std::nullopt);
         ASSERT_EQ(store.setEnabled({directory + "/x.ttf"}, false).error, std::nullopt);
     }
-    EXPECT_FALSE(nextRun().change.isRegistryChanged);
+    const auto change = nextRun().change;
+    EXPECT_THAT(change.available, IsEmpty());
+    EXPECT_THAT(change.gone, IsEmpty());
     EXPECT_TRUE(registry().find(directory + "/x.ttf")->find("disabled")->isTrue());
 }
 

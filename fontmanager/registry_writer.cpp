@@ -11,7 +11,9 @@
 #include <span>
 #include <utility>
 
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 namespace typhon {
 
@@ -106,7 +108,28 @@ std::optional<std::string> RegistryWriter::update(const Change& change, const St
     if (!error && beforeReplacing) {
         error = beforeReplacing();
     }
+    error = error ? error : markUnreported();
     return error ? error : finishReplacement(path);
+}
+
+/// Not flushed: whoever would have to hear of it does not survive a loss of power either.
+std::optional<std::string> RegistryWriter::markUnreported() const
+{
+    const auto path = root_.real(font_paths::unreported);
+    const FileDescriptor mark(
+        ::open(path.c_str(), O_CREAT | O_WRONLY | O_CLOEXEC | O_NOFOLLOW, registryPermissions));
+    const int error = errno;
+    return mark ? std::nullopt : std::optional("cannot make " + path + ": " + errorText(error));
+}
+
+bool RegistryWriter::isUnreported() const
+{
+    return ::access(root_.real(font_paths::unreported).c_str(), F_OK) == 0;
+}
+
+void RegistryWriter::wasReported()
+{
+    ::unlink(root_.real(font_paths::unreported).c_str());
 }
 
 std::optional<std::string> RegistryWriter::add(const std::vector<RegisteredFont>& fonts)

@@ -96,8 +96,6 @@ void waitForTheEnd(HelperLife& life, const FontRegistryService& service, Log& lo
 /// Makes up for what an earlier run, which may have been killed, did not report any more.
 Task<void> reportCompleted(Helper& helper, RegistryChange change)
 {
-    // Whatever it wrote last, the daemon is to read it.
-    change.isRegistryChanged = true;
     Task<void> reporting = helper.reports.report(std::move(change), ChangeReports::Kind::userFonts);
     co_await std::move(reporting);
     helper.store.changeWasReported();
