@@ -52,8 +52,8 @@ public:
     using Step = std::function<std::optional<std::string>()>;
     std::optional<std::string> update(const Change& change, const Step& beforeReplacing = {});
 
-    /// True from when a registry takes its place until `wasReported`, also in later runs: the one that wrote it
-    /// may have been killed before it told anybody.
+    /// True from when a registry takes its place until `wasReported`, also in later runs: the one that wrote
+    /// it may have been killed before it told anybody.
     bool isUnreported() const;
     void wasReported();
 
