@@ -76,7 +76,10 @@ def hand_over(path, endpoint):
     received = b""
     with client.socket:
         while len(received) < 16 or len(received) < 20 + (struct.unpack_from("<I", received, 12)[0] + 7) // 8 * 8:
-            received += client.socket.recv(4096)
+            more = client.socket.recv(4096)
+            if not more:
+                return "the connection ended"
+            received += more
     return struct.unpack("<I", received[-4:])[0] == 1 if received[1] == 2 else "an error"
 
 
@@ -132,8 +135,10 @@ class OtherUsers(unittest.TestCase):
         def both(ours):
             listening, endpoint = listen(self.common)
             if os.fork() == 0:
-                hand_over(self.socket, endpoint)
-                os._exit(0)
+                try:
+                    hand_over(self.socket, endpoint)
+                finally:
+                    os._exit(0)
             with listening, listening.accept()[0] as connection:
                 connection.settimeout(PATIENCE)
                 # The daemon plays the server: it speaks when it is spoken to.
