@@ -134,6 +134,9 @@ struct SessionAgentsTest : ::testing::Test {
     LinuxIpc client{pool, queues, log, root, tokenOfPeer, IpcLimits{}, EndpointHandshake::client};
     std::shared_ptr<Listener> listener = startSessionAgentService(ipc, service);
 
+    // The end of a connection may still be handled.
+    ~SessionAgentsTest() override { pool.stop(); }
+
     bool isVisible(const AuditToken& process)
     {
         const auto state = lifecycle.currentState(LWSProcessIdentifier::identifierWithPid(process));
