@@ -30,8 +30,9 @@ Task<void> TyphonHandler::checkin(OptionalDictionaryReply reply)
     }
     if (isFontProvider_) {
         // Before the first change can come, which a provider without a name would miss.
+        const auto& identifier = capabilities.identifier;
         const std::lock_guard lock(mutex_);
-        processIdentifier_ = capabilities.identifier;
+        processIdentifier_ = identifier ? std::make_unique<const std::string>(*identifier) : nullptr;
     }
     daemon->notificationCenter().addObserver(shared_from_this(), "fontChanged", &TyphonHandler::fontChanged);
     auto answering = daemon->perClientFontInfo().setupUserInstalledFontsFor(
@@ -136,7 +137,7 @@ void TyphonHandler::fontChanged(const PropertyList& notification)
 std::optional<std::string> TyphonHandler::processIdentifier() const
 {
     const std::lock_guard lock(mutex_);
-    return processIdentifier_;
+    return processIdentifier_ ? std::optional(*processIdentifier_) : std::nullopt;
 }
 
 std::shared_ptr<Connection> TyphonHandler::clientConnection() const
@@ -167,7 +168,7 @@ void TyphonHandler::setServer(std::shared_ptr<TyphonServer> server)
 std::optional<std::vector<std::shared_ptr<Connection>>> TyphonHandler::webcontentProcessConnections() const
 {
     const std::lock_guard lock(mutex_);
-    return webcontentProcessConnections_;
+    return webcontentProcessConnections_ ? std::optional(*webcontentProcessConnections_) : std::nullopt;
 }
 
 }  // namespace typhon

@@ -15,7 +15,7 @@ namespace typhon {
 /// The object behind one client's connection. Answers the check-in, remembers what the client may do for as
 /// long as it is connected, and passes everything else on to the daemon. Holds its connection until that is
 /// invalidated, and the daemon for good. Accessors may be called from any thread.
-class TyphonHandler final : public TyphonDaemonProtocol, public std::enable_shared_from_this<TyphonHandler> {
+class TyphonHandler : public TyphonDaemonProtocol, public std::enable_shared_from_this<TyphonHandler> {
 public:
     /// `initWithTyphonDaemon:`
     explicit TyphonHandler(std::shared_ptr<TyphonServer> typhonDaemon);
@@ -74,8 +74,9 @@ private:
     // Protected by mutex_.
     std::shared_ptr<Connection> clientConnection_;
     std::shared_ptr<TyphonServer> server_;
-    std::optional<std::string> processIdentifier_;
-    std::optional<std::vector<std::shared_ptr<Connection>>> webcontentProcessConnections_;
+    // Null for most clients, which are many and idle.
+    std::unique_ptr<const std::string> processIdentifier_;
+    std::unique_ptr<std::vector<std::shared_ptr<Connection>>> webcontentProcessConnections_;
 };
 
 }  // namespace typhon

@@ -122,7 +122,7 @@ void TyphonHandler::addWebContentProcessConnection(std::shared_ptr<Connection> c
     // there never is. No list of content processes is kept; their connections live by what is pending on
     // them.
     if (webcontentProcessConnections_) {
-        webcontentProcessConnections_.emplace();
+        webcontentProcessConnections_ = std::make_unique<std::vector<std::shared_ptr<Connection>>>();
     }
     if (webcontentProcessConnections_) {
         webcontentProcessConnections_->push_back(std::move(connection));

@@ -27,19 +27,15 @@ std::span<const DispatchedOperation> dispatchTable();
 /// Handles a client's call as the table says, on the queue of the client's connection.
 Task<void> dispatch(std::shared_ptr<TyphonHandler> handler, std::shared_ptr<IncomingCall> call);
 
-/// What a client's connection exports: its handler, by way of the dispatch table.
-class ExportedHandler final : public ExportedObject {
+/// A handler as its client's connection exports it: calls reach it by way of the dispatch table.
+class ExportedHandler final : public TyphonHandler, public ExportedObject {
 public:
-    explicit ExportedHandler(std::shared_ptr<TyphonHandler> handler) : handler_(std::move(handler)) {}
+    using TyphonHandler::TyphonHandler;
 
     Task<void> handle(std::shared_ptr<IncomingCall> call) override
     {
-        return dispatch(handler_, std::move(call));
+        return dispatch(shared_from_this(), std::move(call));
     }
-    const std::shared_ptr<TyphonHandler>& handler() const { return handler_; }
-
-private:
-    std::shared_ptr<TyphonHandler> handler_;
 };
 
 }  // namespace typhon

@@ -116,8 +116,8 @@ bool TyphonDaemon::listener(Listener& /*listener*/, std::shared_ptr<Connection> 
 {
     const auto& connection = shouldAcceptNewConnection;
     connection->setExportedInterfaces(wire::typhonDaemonInterfaces());
-    const auto handler = std::make_shared<TyphonHandler>(shared_from_this());
-    connection->setExportedObject(std::make_shared<ExportedHandler>(handler));
+    const auto handler = std::make_shared<ExportedHandler>(shared_from_this());
+    connection->setExportedObject(handler);
     connection->setRemoteObjectInterfaces(wire::typhonClientInterfaces());
     // The handler holds its connection and the connection its handler, until this breaks the cycle.
     connection->setInvalidationHandler([handler] { handler->setClientConnection(nullptr); });

@@ -1,5 +1,4 @@
 #include "clients/typhon_handler.h"
-#include "daemon/operations.h"
 #include "daemon/typhon_daemon.h"
 #include "platform/simulated/simulated_platform.h"
 #include "protocol/wire.h"
@@ -83,7 +82,7 @@ protected:
     std::shared_ptr<TyphonHandler> accept(const SimulatedConnectionPair& pair)
     {
         EXPECT_TRUE(daemon->listener(*simulated.ipc.anonymousListener(), pair.accepted));
-        return std::dynamic_pointer_cast<ExportedHandler>(pair.accepted->exportedObject())->handler();
+        return std::dynamic_pointer_cast<TyphonHandler>(pair.accepted->exportedObject());
     }
 
     SimulatedPlatform simulated;

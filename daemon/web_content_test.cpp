@@ -1,5 +1,4 @@
 #include "clients/typhon_handler.h"
-#include "daemon/operations.h"
 #include "daemon/typhon_daemon.h"
 #include "platform/simulated/simulated_platform.h"
 #include "protocol/wire.h"
@@ -104,7 +103,7 @@ protected:
         auto pair = simulated.connect(hostToken, wire::typhonDaemonInterfaces());
         host = pair.client;
         EXPECT_TRUE(daemon->listener(*simulated.ipc.anonymousListener(), pair.accepted));
-        handler = std::dynamic_pointer_cast<ExportedHandler>(pair.accepted->exportedObject())->handler();
+        handler = std::dynamic_pointer_cast<TyphonHandler>(pair.accepted->exportedObject());
         host->call(wire::checkin.interface, wire::checkin.member, {}, nullptr, nullptr);
         simulated.drain();
         issuedBefore = simulated.sandbox.issued().size();
