@@ -3,6 +3,7 @@
 #include "hostile_client.h"
 
 #include "platform/linux/bus_message.h"
+#include "platform/linux/descriptor_passing.h"
 #include "platform/linux/introspection.h"
 #include "platform/linux/memory_file.h"
 #include "platform/linux/opened_bus.h"
@@ -11,8 +12,8 @@
 #include "sdk/service_socket.h"
 
 #include <array>
-#include <cstring>
 #include <functional>
+#include <span>
 #include <stdexcept>
 #include <vector>
 
@@ -119,20 +120,8 @@ bool HostileClient::send(int socket, std::string_view bytes, bool reads)
 
 bool HostileClient::sendWithDescriptors(int socket, std::string_view bytes, int descriptor, std::size_t count)
 {
-    iovec part{const_cast<char*>(bytes.data()), bytes.size()};
-    std::vector<char> control(CMSG_SPACE(count * sizeof(int)));
-    msghdr message{};
-    message.msg_iov = &part;
-    message.msg_iovlen = 1;
-    message.msg_control = control.data();
-    message.msg_controllen = control.size();
-    auto* rights = CMSG_FIRSTHDR(&message);
-    rights->cmsg_level = SOL_SOCKET;
-    rights->cmsg_type = SCM_RIGHTS;
-    rights->cmsg_len = CMSG_LEN(count * sizeof(int));
-    const std::vector<int> copies(count, descriptor);
-    std::memcpy(CMSG_DATA(rights), copies.data(), count * sizeof(int));
-    return ::sendmsg(socket, &message, MSG_NOSIGNAL) > 0;
+    const std::span data(reinterpret_cast<const std::uint8_t*>(bytes.data()), bytes.size());
+    return typhon::sendWithDescriptors(socket, data, std::vector<int>(count, descriptor)) > 0;
 }
 
 /// Waits for something to read; false when the connection has ended.

@@ -1,5 +1,6 @@
 #include "fontmanager/font_zygote.h"
 
+#include "platform/linux/descriptor_passing.h"
 #include "platform/linux/regular_file.h"
 #include "platform/linux/started_program.h"
 #include "platform/linux/visible_text.h"
@@ -7,7 +8,6 @@
 #include <array>
 #include <cerrno>
 #include <csignal>
-#include <cstring>
 #include <memory>
 #include <span>
 #include <utility>
@@ -57,20 +57,8 @@ std::optional<Packet> receive(int socket)
 
 bool sendRequest(int socket, const FontRequest& request, const std::array<int, 2>& descriptors)
 {
-    FontRequest copy = request;
-    iovec data{&copy, sizeof copy};
-    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof descriptors)> control{};
-    msghdr message{};
-    message.msg_iov = &data;
-    message.msg_iovlen = 1;
-    message.msg_control = control.data();
-    message.msg_controllen = control.size();
-    auto* header = CMSG_FIRSTHDR(&message);
-    header->cmsg_level = SOL_SOCKET;
-    header->cmsg_type = SCM_RIGHTS;
-    header->cmsg_len = CMSG_LEN(sizeof descriptors);
-    std::memcpy(CMSG_DATA(header), descriptors.data(), sizeof descriptors);
-    return ::sendmsg(socket, &message, MSG_NOSIGNAL) == sizeof copy;
+    const std::span bytes(reinterpret_cast<const std::uint8_t*>(&request), sizeof request);
+    return sendWithDescriptors(socket, bytes, descriptors) == sizeof request;
 }
 
 /// Takes what is in the pipe, and closes it at its end or when there is too much.

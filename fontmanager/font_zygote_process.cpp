@@ -3,11 +3,11 @@
 #include "fontmanager/font_answer.h"
 #include "fontmanager/font_request.h"
 #include "fontmanager/parser_confinement.h"
+#include "platform/linux/descriptor_passing.h"
 #include "platform/linux/file_descriptor.h"
 
 #include <array>
 #include <csignal>
-#include <cstring>
 #include <new>
 #include <optional>
 #include <span>
@@ -46,23 +46,6 @@ bool send(const Packet& packet)
     return ::sendto(zygoteControl, &packet, sizeof packet, MSG_NOSIGNAL, nullptr, 0) == sizeof packet;
 }
 
-/// The two descriptors of a request. Whatever else came is closed.
-void takeDescriptors(msghdr& message, ReceivedRequest& received)
-{
-    for (auto* header = CMSG_FIRSTHDR(&message); header != nullptr; header = CMSG_NXTHDR(&message, header)) {
-        if (header->cmsg_level != SOL_SOCKET || header->cmsg_type != SCM_RIGHTS) {
-            continue;
-        }
-        const auto count = (header->cmsg_len - CMSG_LEN(0)) / sizeof(int);
-        for (std::size_t index = 0; index < count; ++index) {
-            int descriptor = -1;
-            std::memcpy(&descriptor, CMSG_DATA(header) + index * sizeof(int), sizeof descriptor);
-            auto& place = !received.font ? received.font : received.answer;
-            place = FileDescriptor(descriptor);
-        }
-    }
-}
-
 std::optional<ReceivedRequest> receive()
 {
     ReceivedRequest received;
@@ -77,7 +60,11 @@ std::optional<ReceivedRequest> receive()
     if (size < 0) {
         return std::nullopt;
     }
-    takeDescriptors(message, received);
+    auto descriptors = takeDescriptors(message);
+    if (descriptors.size() == 2) {
+        received.font = std::move(descriptors[0]);
+        received.answer = std::move(descriptors[1]);
+    }
     const bool isWhole = size == sizeof received.request && received.request.version == fontRequestVersion;
     return isWhole && received.answer ? std::optional(std::move(received)) : std::nullopt;
 }

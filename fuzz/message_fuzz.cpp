@@ -4,6 +4,7 @@
 
 #include "platform/linux/bus_message.h"
 #include "platform/linux/bus_message_codec.h"
+#include "platform/linux/descriptor_passing.h"
 #include "platform/linux/memory_file.h"
 #include "platform/linux/message_bytes.h"
 #include "platform/linux/message_decoder.h"
@@ -16,7 +17,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
-#include <cstring>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -47,22 +48,9 @@ bool sendPiece(int socket, std::string_view bytes, unsigned descriptors)
 {
     static const auto file =
         sealedMemoryFile(writeBinaryPropertyList(PropertyList(PropertyList::Dictionary{{"key", "value"}})));
-    iovec part{const_cast<char*>(bytes.data()), bytes.size()};
-    alignas(cmsghdr) char control[CMSG_SPACE(3 * sizeof(int))];
-    msghdr message{};
-    message.msg_iov = &part;
-    message.msg_iovlen = 1;
-    if (descriptors > 0) {
-        message.msg_control = control;
-        message.msg_controllen = CMSG_SPACE(descriptors * sizeof(int));
-        auto* rights = CMSG_FIRSTHDR(&message);
-        rights->cmsg_level = SOL_SOCKET;
-        rights->cmsg_type = SCM_RIGHTS;
-        rights->cmsg_len = CMSG_LEN(descriptors * sizeof(int));
-        const int copies[] = {file.get(), file.get(), file.get()};
-        std::memcpy(CMSG_DATA(rights), copies, descriptors * sizeof(int));
-    }
-    return ::sendmsg(socket, &message, MSG_DONTWAIT | MSG_NOSIGNAL) == static_cast<ssize_t>(bytes.size());
+    const std::span data(reinterpret_cast<const std::uint8_t*>(bytes.data()), bytes.size());
+    const std::vector<int> copies(descriptors, file.get());
+    return sendWithDescriptors(socket, data, copies, MSG_DONTWAIT) == static_cast<ssize_t>(bytes.size());
 }
 
 /// What became of the messages: the number of those that were understood, how it ended, and their arguments.

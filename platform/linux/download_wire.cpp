@@ -1,5 +1,6 @@
 #include "platform/linux/download_wire.h"
 
+#include "platform/linux/descriptor_passing.h"
 #include "platform/linux/file_descriptor.h"
 #include "platform/linux/memory_file.h"
 #include "platform/linux/property_list_reader.h"
@@ -8,8 +9,8 @@
 
 #include <array>
 #include <cerrno>
-#include <cstring>
 #include <span>
+#include <utility>
 
 #include <poll.h>
 #include <sys/socket.h>
@@ -29,35 +30,9 @@ struct Packet {
 
 bool sendPacket(int socket, const PropertyList& value, int file)
 {
-    auto bytes = writeBinaryPropertyList(value);
-    iovec data{bytes.data(), bytes.size()};
-    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof file)> control{};
-    msghdr message{};
-    message.msg_iov = &data;
-    message.msg_iovlen = 1;
-    if (file >= 0) {
-        message.msg_control = control.data();
-        message.msg_controllen = control.size();
-        auto* header = CMSG_FIRSTHDR(&message);
-        header->cmsg_level = SOL_SOCKET;
-        header->cmsg_type = SCM_RIGHTS;
-        header->cmsg_len = CMSG_LEN(sizeof file);
-        std::memcpy(CMSG_DATA(header), &file, sizeof file);
-    }
-    return ::sendmsg(socket, &message, MSG_NOSIGNAL | MSG_DONTWAIT) == static_cast<ssize_t>(bytes.size());
-}
-
-/// There is room for one descriptor; the kernel drops any more.
-FileDescriptor descriptorIn(msghdr& message)
-{
-    FileDescriptor file;
-    auto* header = CMSG_FIRSTHDR(&message);
-    if (header != nullptr && header->cmsg_level == SOL_SOCKET && header->cmsg_type == SCM_RIGHTS) {
-        int descriptor = -1;
-        std::memcpy(&descriptor, CMSG_DATA(header), sizeof descriptor);
-        file = FileDescriptor(descriptor);
-    }
-    return file;
+    const auto bytes = writeBinaryPropertyList(value);
+    const std::span files(&file, file >= 0 ? 1 : 0);
+    return sendWithDescriptors(socket, bytes, files, MSG_DONTWAIT) == static_cast<ssize_t>(bytes.size());
 }
 
 Packet receivePacket(int socket)
@@ -74,7 +49,9 @@ Packet receivePacket(int socket)
     if (size <= 0) {
         return {};
     }
-    Packet packet{std::nullopt, descriptorIn(message)};
+    // There is room for one descriptor; the kernel drops any more.
+    auto files = takeDescriptors(message);
+    Packet packet{std::nullopt, files.empty() ? FileDescriptor() : std::move(files.front())};
     if ((message.msg_flags & (MSG_TRUNC | MSG_CTRUNC)) == 0) {
         const std::span bytes(buffer.data(), static_cast<std::size_t>(size));
         packet.value = readPropertyList(bytes, packetLimits).value;

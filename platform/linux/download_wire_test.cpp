@@ -1,10 +1,10 @@
+#include "platform/linux/descriptor_passing.h"
 #include "platform/linux/download_wire.h"
 #include "platform/linux/memory_file.h"
 #include "platform/linux/property_list_writer.h"
 #include "platform/linux/scratch_directory.h"
 
 #include <array>
-#include <cstring>
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -37,22 +37,7 @@ protected:
     /// What a downloader can send that was taken over.
     void sendRaw(const Bytes& packet, const std::vector<int>& files = {})
     {
-        Bytes copy = packet;
-        iovec data{copy.data(), copy.size()};
-        alignas(cmsghdr) std::array<char, CMSG_SPACE(8 * sizeof(int))> control{};
-        msghdr message{};
-        message.msg_iov = &data;
-        message.msg_iovlen = 1;
-        if (!files.empty()) {
-            message.msg_control = control.data();
-            message.msg_controllen = CMSG_SPACE(files.size() * sizeof(int));
-            auto* header = CMSG_FIRSTHDR(&message);
-            header->cmsg_level = SOL_SOCKET;
-            header->cmsg_type = SCM_RIGHTS;
-            header->cmsg_len = CMSG_LEN(files.size() * sizeof(int));
-            std::memcpy(CMSG_DATA(header), files.data(), files.size() * sizeof(int));
-        }
-        ASSERT_EQ(::sendmsg(theirs.get(), &message, MSG_NOSIGNAL), static_cast<ssize_t>(copy.size()));
+        ASSERT_EQ(sendWithDescriptors(theirs.get(), packet, files), static_cast<ssize_t>(packet.size()));
     }
     DownloadAnswer answer(std::size_t mostBytes = 100)
     {

@@ -1,12 +1,13 @@
 // What a peer may cost, and what becomes of one that costs more.
 
+#include "platform/linux/descriptor_passing.h"
 #include "platform/linux/memory_file.h"
 #include "platform/linux/property_list_writer.h"
 #include "testing/ipc_service.h"
 #include "testing/wire_message.h"
 
 #include <algorithm>
-#include <cstring>
+#include <span>
 #include <thread>
 
 #include <fcntl.h>
@@ -162,20 +163,8 @@ TEST(LinuxIpcLimits, MessagesInPiecesAreUnderstoodHoweverTheyAreCut)
 ssize_t sendWithDescriptors(int socket, std::string_view bytes, std::size_t count)
 {
     const FileDescriptor file(::open("/dev/null", O_RDONLY | O_CLOEXEC));
-    iovec part{const_cast<char*>(bytes.data()), bytes.size()};
-    std::vector<char> control(CMSG_SPACE(count * sizeof(int)));
-    msghdr message{};
-    message.msg_iov = &part;
-    message.msg_iovlen = 1;
-    message.msg_control = control.data();
-    message.msg_controllen = control.size();
-    auto* rights = CMSG_FIRSTHDR(&message);
-    rights->cmsg_level = SOL_SOCKET;
-    rights->cmsg_type = SCM_RIGHTS;
-    rights->cmsg_len = CMSG_LEN(count * sizeof(int));
-    const std::vector<int> copies(count, file.get());
-    std::memcpy(CMSG_DATA(rights), copies.data(), count * sizeof(int));
-    return ::sendmsg(socket, &message, MSG_NOSIGNAL);
+    const std::span data(reinterpret_cast<const std::uint8_t*>(bytes.data()), bytes.size());
+    return typhon::sendWithDescriptors(socket, data, std::vector<int>(count, file.get()));
 }
 
 TEST(LinuxIpcLimits, DescriptorsOfHalfAMessageAreLimited)

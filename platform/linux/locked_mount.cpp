@@ -1,11 +1,15 @@
 #include "platform/linux/locked_mount.h"
 
+#include "platform/linux/descriptor_passing.h"
 #include "platform/linux/inode.h"
 
 #include <algorithm>
-#include <cstring>
+#include <array>
+#include <cstdint>
+#include <span>
 #include <string>
 #include <string_view>
+#include <utility>
 
 #include <fcntl.h>
 #include <linux/mount.h>
@@ -67,45 +71,27 @@ int makeMount(int directory, const Identifiers& identifiers)
     return cloneOfWorkingDirectory();
 }
 
-union ControlMessage {
-    cmsghdr header;
-    char bytes[CMSG_SPACE(sizeof(int))];
-};
-
 void send(int socket, int descriptor)
 {
-    char byte = 0;
-    iovec data{&byte, 1};
-    ControlMessage control{};
-    control.header.cmsg_len = CMSG_LEN(sizeof(int));
-    control.header.cmsg_level = SOL_SOCKET;
-    control.header.cmsg_type = SCM_RIGHTS;
-    std::memcpy(CMSG_DATA(&control.header), &descriptor, sizeof descriptor);
-    msghdr message{};
-    message.msg_iov = &data;
-    message.msg_iovlen = 1;
-    message.msg_control = control.bytes;
-    message.msg_controllen = sizeof control.bytes;
-    ::sendmsg(socket, &message, MSG_NOSIGNAL);
+    constexpr std::uint8_t byte = 0;
+    sendWithDescriptors(socket, std::span(&byte, 1), std::span(&descriptor, 1));
 }
 
 FileDescriptor receive(int socket)
 {
     char byte = 0;
     iovec data{&byte, 1};
-    ControlMessage control{};
+    alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int))> control{};
     msghdr message{};
     message.msg_iov = &data;
     message.msg_iovlen = 1;
-    message.msg_control = control.bytes;
-    message.msg_controllen = sizeof control.bytes;
-    const auto* header =
-        ::recvmsg(socket, &message, MSG_CMSG_CLOEXEC) > 0 ? CMSG_FIRSTHDR(&message) : nullptr;
-    int descriptor = -1;
-    if (header != nullptr && header->cmsg_type == SCM_RIGHTS) {
-        std::memcpy(&descriptor, CMSG_DATA(header), sizeof descriptor);
+    message.msg_control = control.data();
+    message.msg_controllen = control.size();
+    if (::recvmsg(socket, &message, MSG_CMSG_CLOEXEC) <= 0) {
+        return {};
     }
-    return FileDescriptor(descriptor);
+    auto descriptors = takeDescriptors(message);
+    return descriptors.empty() ? FileDescriptor() : std::move(descriptors.front());
 }
 
 bool isReadOnly(int mount)

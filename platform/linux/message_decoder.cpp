@@ -1,10 +1,9 @@
 #include "platform/linux/message_decoder.h"
 
+#include "platform/linux/descriptor_passing.h"
 #include "platform/linux/message_bytes.h"
 
-#include <array>
 #include <cerrno>
-#include <cstring>
 #include <optional>
 #include <string_view>
 
@@ -144,24 +143,11 @@ sd_bus_message* MessageDecoder::feed(ReceivedMessage& received)
 bool MessageDecoder::sendSome(std::span<const std::uint8_t>& bytes,
                               const std::vector<FileDescriptor>& descriptors)
 {
-    iovec part{const_cast<std::uint8_t*>(bytes.data()), bytes.size()};
-    msghdr message{};
-    message.msg_iov = &part;
-    message.msg_iovlen = 1;
-    std::vector<char> control(CMSG_SPACE(descriptors.size() * sizeof(int)));
-    if (!descriptors.empty()) {
-        message.msg_control = control.data();
-        message.msg_controllen = control.size();
-        auto* rights = CMSG_FIRSTHDR(&message);
-        rights->cmsg_level = SOL_SOCKET;
-        rights->cmsg_type = SCM_RIGHTS;
-        rights->cmsg_len = CMSG_LEN(descriptors.size() * sizeof(int));
-        for (std::size_t index = 0; index < descriptors.size(); ++index) {
-            const int descriptor = descriptors[index].get();
-            std::memcpy(CMSG_DATA(rights) + index * sizeof(int), &descriptor, sizeof descriptor);
-        }
+    std::vector<int> passed;
+    for (const auto& descriptor : descriptors) {
+        passed.push_back(descriptor.get());
     }
-    const auto sent = ::sendmsg(bus_.farEnd(), &message, MSG_DONTWAIT | MSG_NOSIGNAL);
+    const auto sent = sendWithDescriptors(bus_.farEnd(), bytes, passed, MSG_DONTWAIT);
     if (sent < 0) {
         return errno == EAGAIN || errno == EINTR;
     }

@@ -1,12 +1,13 @@
 #include "platform/linux/message_reception.h"
 
+#include "platform/linux/descriptor_passing.h"
 #include "platform/linux/message_bytes.h"
 #include "platform/linux/plain_message.h"
 
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <cstring>
+#include <iterator>
 #include <span>
 #include <utility>
 
@@ -21,8 +22,6 @@ namespace {
 constexpr std::size_t smallLook = 4U << 10;
 /// Messages up to this size are read by sd-bus itself.
 constexpr std::size_t largeLook = 64U << 10;
-/// The kernel passes no more at once.
-constexpr std::size_t maximumDescriptors = 253;
 
 using Bytes = std::span<const std::uint8_t>;
 
@@ -143,7 +142,7 @@ MessageReception::Outcome MessageReception::readMore(int socket)
     const auto missing = (size_ > 0 ? static_cast<std::size_t>(size_) : messageHeaderSize) - bytes.size();
     const auto room = scratch().first(std::min(missing, largeLook));
     iovec part{room.data(), room.size()};
-    alignas(cmsghdr) std::array<char, CMSG_SPACE(maximumDescriptors * sizeof(int))> control;
+    alignas(cmsghdr) std::array<char, CMSG_SPACE(maximumPassedDescriptors * sizeof(int))> control;
     msghdr message{};
     message.msg_iov = &part;
     message.msg_iovlen = 1;
@@ -165,17 +164,7 @@ MessageReception::Outcome MessageReception::readMore(int socket)
 
 bool MessageReception::keepDescriptors(msghdr& message)
 {
-    for (auto* part = CMSG_FIRSTHDR(&message); part != nullptr; part = CMSG_NXTHDR(&message, part)) {
-        if (part->cmsg_level != SOL_SOCKET || part->cmsg_type != SCM_RIGHTS) {
-            continue;
-        }
-        const auto count = (part->cmsg_len - CMSG_LEN(0)) / sizeof(int);
-        for (std::size_t index = 0; index < count; ++index) {
-            int descriptor = -1;
-            std::memcpy(&descriptor, CMSG_DATA(part) + index * sizeof(int), sizeof descriptor);
-            message_.descriptors.emplace_back(descriptor);
-        }
-    }
+    std::ranges::move(takeDescriptors(message), std::back_inserter(message_.descriptors));
     // Truncated: there was no room for more descriptors in the process.
     const auto limit = descriptorsAllowed_ ? limits_.descriptors : 0;
     return message_.descriptors.size() <= limit && (message.msg_flags & MSG_CTRUNC) == 0;
