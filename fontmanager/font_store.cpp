@@ -82,6 +82,7 @@ RegistryChangeOutcome FontStore::open()
         return {.change = {}, .error = *lock_->error() + "; another process changes the fonts already"};
     }
     const bool isUnreported = registry_.isUnreported();
+    ++changesUnderWay_;
     auto outcome = completeInterruptedChange();
     outcome.change.isRegistryChanged = outcome.change.isRegistryChanged || isUnreported;
     if (!outcome.error) {
@@ -226,9 +227,18 @@ RegistryChangeOutcome FontStore::synchronizeProviders()
     });
 }
 
+void FontStore::changeBegins()
+{
+    const std::lock_guard lock(mutex_);
+    ++changesUnderWay_;
+}
+
 void FontStore::changeWasReported()
 {
     const std::lock_guard lock(mutex_);
+    if (--changesUnderWay_ > 0) {
+        return;
+    }
     registry_.wasReported();
     if (const auto error = eraseCompletedChange()) {
         TYLog_Error(log_, *error);

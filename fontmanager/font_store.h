@@ -45,11 +45,13 @@ public:
     FontStore(RootDirectory root, ReadFontNames readNames, Log& log, RegistrationLimits limits = {});
 
     /// Takes the store for this process, completes a change that was interrupted, and removes copies that
-    /// nobody will use. The change that was completed, or may not have been reported, if any. Once, before
-    /// anything else.
+    /// nobody will use. The change that was completed, or may not have been reported, if any: it is under way
+    /// until `changeWasReported`. Once, before anything else.
     RegistryChangeOutcome open();
-    /// The changes that operations gave have been reported. Without it, what the latest one placed or removed
-    /// is given once more by the next run.
+    /// A change of the registry, by the store or by others in this process, is under way from now on.
+    void changeBegins();
+    /// One of those under way has been reported. Until that can be said of all, what the latest one of the
+    /// store placed or removed is given once more by the next run.
     void changeWasReported();
 
     struct Beginning {
@@ -98,6 +100,7 @@ private:
     ChangeJournal journal_;
     /// The change in the journal is complete, but may not have been reported.
     bool isJournalComplete_ = false;
+    unsigned changesUnderWay_ = 0;
     std::optional<FileLock> lock_;
     std::uint64_t serial_ = 0;
 };

@@ -170,6 +170,23 @@ TEST_F(InterruptedChangeTest, OneThatWasReportedIsNot)
     EXPECT_FALSE(nextRun().change.isRegistryChanged);
 }
 
+TEST_F(InterruptedChangeTest, TheReportOfAnotherChangeBesideItIsNotTakenForItsOwn)
+{
+    registerOld();
+    {
+        FontStore killed(root, readText, log);
+        killed.open();
+        killed.changeWasReported();
+        killed.changeBegins();
+        killed.changeBegins();
+        killed.unregister({directory + "/old.ttf"});
+        killed.changeWasReported();
+    }
+    const auto change = nextRun().change;
+    EXPECT_TRUE(change.isRegistryChanged);
+    EXPECT_THAT(change.gone, ElementsAre(directory + "/old.ttf"));
+}
+
 TEST_F(InterruptedChangeTest, OneThatWasNotReportedIsNotDoneAgainOverALaterChange)
 {
     {

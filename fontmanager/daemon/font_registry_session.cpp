@@ -355,6 +355,7 @@ Task<RegistryChangeOutcome> FontRegistrySession::change(Self self,
     const auto& parts = self->service_->parts();
     Task<void> announcing = parts.reports.announce();
     co_await std::move(announcing);
+    parts.store.changeBegins();
     auto outcome = work(parts.store);
     if (outcome.error) {
         TYLog_Error(parts.log, "fonts were not changed: " + *outcome.error);
