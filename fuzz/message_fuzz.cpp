@@ -74,7 +74,7 @@ std::string describe(sd_bus_message* message)
 
 class Peer {
 public:
-    Peer() : reception_({largestMessage, 3}, std::make_unique<HeldBytes::Claim>(held(), AuditToken{}))
+    Peer()
     {
         require(bus_.open(true) >= 0, "a bus opens");
         int pair[2];
@@ -95,10 +95,11 @@ public:
     }
 
 private:
-    static std::shared_ptr<HeldBytes> held()
+    MessageReception::Source source() const
     {
-        static const auto bytes = std::make_shared<HeldBytes>(1U << 20, 1U << 20);
-        return bytes;
+        static const auto held = std::make_shared<HeldBytes>(1U << 20, 1U << 20);
+        static const AuditToken peer;
+        return {bus_.socket(), largestMessage, 3, held, peer};
     }
     static int keep(sd_bus_message* message, void* peer, sd_bus_error*)
     {
@@ -133,7 +134,7 @@ private:
     }
     bool readOne()
     {
-        switch (reception_.next(bus_.socket())) {
+        switch (reception_.next(source())) {
         case Outcome::ready:
             return readReady();
         case Outcome::assembled: {

@@ -45,17 +45,13 @@ std::unique_ptr<Handshake> newHandshake(BusLink::Role role)
 BusLink::BusLink(std::shared_ptr<IpcContext> context, FileDescriptor socket, Role role, AuditToken peerToken,
                  std::weak_ptr<Owner> owner)
     : peer(peerToken), context_(std::move(context)), role_(role), owner_(std::move(owner)),
-      socket_(std::move(socket)),
-      reception_({context_->limits.message.bytes, context_->limits.message.descriptors},
-                 std::make_unique<HeldBytes::Claim>(context_->heldBytes, peerToken)),
-      outgoing_(std::make_unique<HeldBytes::Claim>(context_->heldBytes, peerToken))
+      socket_(std::move(socket))
 {}
 
 BusLink::~BusLink()
 {
     watch_.reset();
-    context_->dispose(std::move(handshakeTimer_));
-    context_->dispose(std::move(messageTimer_));
+    context_->dispose(std::move(deadline_));
     context_->dispose(std::move(restTimer_));
 }
 
@@ -67,7 +63,7 @@ void BusLink::start()
         }
         ::fcntl(socket_.get(), F_SETFL, O_NONBLOCK);
         handshake_ = newHandshake(role_);
-        startTimer(handshakeTimer_, context_->limits.handshake, "it did not finish the handshake in time");
+        startDeadline(context_->limits.handshake, "it did not finish the handshake in time");
         watch(socket_.get());
         const auto pause = context_->pace.restAfterConnecting(peer, std::chrono::steady_clock::now());
         if (pause > std::chrono::nanoseconds::zero()) {
@@ -116,9 +112,8 @@ void BusLink::proceedWithHandshake(Afterwards& afterwards)
 void BusLink::becomeReady(Afterwards& afterwards)
 {
     descriptorsAllowed_ = handshake_->descriptorsAgreed();
-    reception_.allowDescriptors(descriptorsAllowed_);
     handshake_.reset();
-    context_->dispose(std::move(handshakeTimer_));
+    context_->dispose(std::move(deadline_));
     watch_.reset();
     int result = bus_.open(descriptorsAllowed_);
     if (result >= 0) {
@@ -133,8 +128,10 @@ void BusLink::becomeReady(Afterwards& afterwards)
     watch(bus_.socket());
     arm();
     std::vector<std::uint64_t> waiting;
-    for (const auto& [number, call] : pending_) {
-        waiting.push_back(number);
+    if (pending_) {
+        for (const auto& [number, call] : pending_->byNumber) {
+            waiting.push_back(number);
+        }
     }
     for (const auto number : waiting) {
         transmit(number, afterwards);
@@ -150,14 +147,26 @@ void BusLink::processOutput(Afterwards& afterwards)
     }
 }
 
+BusLink::PendingCall* BusLink::pendingCall(std::uint64_t number)
+{
+    if (!pending_) {
+        return nullptr;
+    }
+    const auto found = pending_->byNumber.find(number);
+    return found == pending_->byNumber.end() ? nullptr : &found->second;
+}
+
 void BusLink::completeCall(std::uint64_t number, CallResult result, Afterwards& afterwards)
 {
-    auto node = pending_.extract(number);
-    if (node.empty()) {
+    if (pendingCall(number) == nullptr) {
         return;
     }
+    auto node = pending_->byNumber.extract(number);
     auto& pending = node.mapped();
-    numberByCookie_.erase(pending.cookie);
+    pending_->numberByCookie.erase(pending.cookie);
+    if (pending_->byNumber.empty()) {
+        pending_.reset();
+    }
     context_->dispose(std::move(pending.timer));
     pending.call.completion(std::move(result), afterwards);
     // What the completion holds may be the last reference to the owner.
@@ -172,7 +181,11 @@ void BusLink::call(OutgoingCall call)
             return;
         }
         const auto number = ++lastNumber_;
-        auto& pending = pending_.emplace(number, PendingCall{std::move(call), 0, nullptr}).first->second;
+        if (!pending_) {
+            pending_ = std::make_unique<PendingCalls>();
+        }
+        auto& pending =
+            pending_->byNumber.emplace(number, PendingCall{std::move(call), 0, nullptr}).first->second;
         if (pending.call.timeout > 0) {
             pending.timer =
                 startTimer(std::chrono::nanoseconds(pending.call.timeout), [number](BusLink& link) {
@@ -190,11 +203,11 @@ void BusLink::call(OutgoingCall call)
 
 void BusLink::transmit(std::uint64_t number, Afterwards& afterwards)
 {
-    const auto found = pending_.find(number);
-    if (found == pending_.end() || ended_) {
+    auto* found = pendingCall(number);
+    if (found == nullptr || ended_) {
         return;
     }
-    auto& pending = found->second;
+    auto& pending = *found;
     auto message = newCall(pending.call);
     const auto size = message ? appendMessage(message.get(), pending.call.inTypes, pending.call.arguments,
                                               descriptorsAllowed_)
@@ -216,7 +229,7 @@ void BusLink::transmit(std::uint64_t number, Afterwards& afterwards)
     }
     if (pending.call.expectReply) {
         pending.cookie = cookie;
-        numberByCookie_.emplace(cookie, number);
+        pending_->numberByCookie.emplace(cookie, number);
     } else {
         completeCall(number, {Arguments{}, {}}, afterwards);
     }
@@ -243,18 +256,23 @@ bool BusLink::send(BusMessage message, const MessageAppending& size, std::uint64
         abandonLocked("a message could not be sent: " + errorText(result), afterwards);
         return false;
     }
-    checkOutgoing(afterwards);
+    outgoing_.sent(size, countWaiting(), outgoingPeer());
+    checkExcess(afterwards);
     if (!ended_ && !outgoing_.isEmpty()) {
         arm();
     }
     return !ended_;
 }
 
-void BusLink::checkOutgoing(Afterwards& afterwards)
+std::uint64_t BusLink::countWaiting() const
 {
     std::uint64_t waiting = 0;
     sd_bus_get_n_queued_write(bus_.get(), &waiting);
-    outgoing_.update(waiting);
+    return waiting;
+}
+
+void BusLink::checkExcess(Afterwards& afterwards)
+{
     const auto excess = outgoing_.excess(context_->limits);
     if (!excess.empty()) {
         punishLocked(excess, afterwards);
@@ -349,13 +367,12 @@ void BusLink::end(Afterwards& afterwards, bool tellOwner)
         return;
     }
     watch_.reset();
-    context_->dispose(std::move(handshakeTimer_));
-    context_->dispose(std::move(messageTimer_));
+    context_->dispose(std::move(deadline_));
     context_->dispose(std::move(restTimer_));
     reception_.take();
     outgoing_.clear();
-    while (!pending_.empty()) {
-        completeCall(pending_.begin()->first, {std::nullopt, disconnectedError}, afterwards);
+    while (pending_) {
+        completeCall(pending_->byNumber.begin()->first, {std::nullopt, disconnectedError}, afterwards);
     }
     bus_.close();
     socket_ = FileDescriptor();
@@ -377,12 +394,12 @@ std::unique_ptr<Timer> BusLink::startTimer(std::chrono::nanoseconds delay,
     return timer;
 }
 
-/// Punishes the peer unless `timer`, one of the link's, is disposed of in time.
-void BusLink::startTimer(std::unique_ptr<Timer>& timer, std::chrono::nanoseconds delay, const char* offence)
+/// Punishes the peer unless the deadline is disposed of in time.
+void BusLink::startDeadline(std::chrono::nanoseconds delay, const char* offence)
 {
-    timer = startTimer(delay, [&timer, offence, started = ++timersStarted_](BusLink& link) {
+    deadline_ = startTimer(delay, [offence, started = ++deadlinesStarted_](BusLink& link) {
         link.locked([&](Afterwards& later) {
-            if (timer && started == link.timersStarted_) {
+            if (link.deadline_ && started == link.deadlinesStarted_) {
                 link.punishLocked(offence, later);
             }
         });

@@ -94,6 +94,10 @@ private:
         std::uint64_t cookie = 0;
         std::unique_ptr<Timer> timer;
     };
+    struct PendingCalls {
+        std::map<std::uint64_t, PendingCall> byNumber;
+        std::map<std::uint64_t, std::uint64_t> numberByCookie;
+    };
 
     template <class Body>
     void locked(Body body);
@@ -117,17 +121,20 @@ private:
     void becomeReady(Afterwards& afterwards);
     void processOutput(Afterwards& afterwards);
     void watch(int descriptor);
-    void startTimer(std::unique_ptr<Timer>& timer, std::chrono::nanoseconds delay, const char* offence);
+    void startDeadline(std::chrono::nanoseconds delay, const char* offence);
     void receive(sd_bus_message* message, Afterwards& afterwards);
     std::optional<std::uint64_t> numberOfReply(sd_bus_message* message) const;
     CallResult readReply(sd_bus_message* message, const OutgoingCall& call) const;
+    PendingCall* pendingCall(std::uint64_t number);
     void completeCall(std::uint64_t number, CallResult result, Afterwards& afterwards);
     void transmit(std::uint64_t number, Afterwards& afterwards);
     BusMessage newCall(const OutgoingCall& call);
     bool send(BusMessage message, const MessageAppending& size, std::uint64_t* cookie,
               Afterwards& afterwards);
     BusMessage callToAnswer(std::uint64_t cookie);
-    void checkOutgoing(Afterwards& afterwards);
+    void checkExcess(Afterwards& afterwards);
+    std::uint64_t countWaiting() const;
+    OutgoingQueue::Peer outgoingPeer() const { return {context_->heldBytes, peer}; }
     void arm();
     void end(Afterwards& afterwards, bool tellOwner);
     std::unique_ptr<Timer> startTimer(std::chrono::nanoseconds delay, std::function<void(BusLink&)> handler);
@@ -143,11 +150,11 @@ private:
     std::unique_ptr<Handshake> handshake_;
     OpenedBus bus_;
     std::unique_ptr<EventPool::Watch> watch_;
-    std::unique_ptr<Timer> handshakeTimer_;
-    std::unique_ptr<Timer> messageTimer_;
+    /// For the handshake, later for the message that has begun.
+    std::unique_ptr<Timer> deadline_;
     std::unique_ptr<Timer> restTimer_;
-    /// Tells a timer whose handler comes late from its successor; there is one at a time.
-    std::uint64_t timersStarted_ = 0;
+    /// Tells a deadline whose handler comes late from its successor.
+    unsigned deadlinesStarted_ = 0;
     bool ready_ = false;
     bool ended_ = false;
     bool descriptorsAllowed_ = false;
@@ -158,8 +165,8 @@ private:
     MessageReception reception_;
     OutgoingQueue outgoing_;
     std::uint64_t lastNumber_ = 0;
-    std::map<std::uint64_t, PendingCall> pending_;
-    std::map<std::uint64_t, std::uint64_t> numberByCookie_;
+    /// Null while there are none.
+    std::unique_ptr<PendingCalls> pending_;
 };
 
 /// Runs `body` under the lock, then what it left for afterwards.

@@ -135,7 +135,8 @@ BusLink::Next BusLink::handleInput(std::uint32_t events, Afterwards& afterwards)
     }
     const auto next = ended_ || inputHeld_ ? Next::wait : processInput(afterwards);
     if (!ended_) {
-        checkOutgoing(afterwards);
+        outgoing_.update(countWaiting(), outgoingPeer());
+        checkExcess(afterwards);
     }
     return ended_ ? Next::wait : next;
 }
@@ -144,7 +145,10 @@ BusLink::Next BusLink::handleInput(std::uint32_t events, Afterwards& afterwards)
 BusLink::Next BusLink::processInput(Afterwards& afterwards)
 {
     using Outcome = MessageReception::Outcome;
-    const auto outcome = reception_.next(bus_.socket());
+    const auto& limits = context_->limits.message;
+    const auto outcome =
+        reception_.next({bus_.socket(), limits.bytes, descriptorsAllowed_ ? limits.descriptors : 0,
+                         context_->heldBytes, peer});
     if (outcome == Outcome::ready) {
         processReadyMessage(afterwards);
         return Next::read;
@@ -179,7 +183,7 @@ void BusLink::processReadyMessage(Afterwards& afterwards)
 /// The message stays where it is until it is decoded, so that it counts as held.
 BusLink::Next BusLink::processAssembledMessage(Afterwards& afterwards)
 {
-    context_->dispose(std::move(messageTimer_));
+    context_->dispose(std::move(deadline_));
     inputHeld_ = true;
     decodingDue_ = true;
     if (!context_->pace.isLimited() || reception_.assembledBytes() <= quicklyDecoded) {
@@ -191,8 +195,8 @@ BusLink::Next BusLink::processAssembledMessage(Afterwards& afterwards)
 
 void BusLink::awaitRest()
 {
-    if (!messageTimer_) {
-        startTimer(messageTimer_, context_->limits.wholeMessage, "it did not finish a message in time");
+    if (!deadline_) {
+        startDeadline(context_->limits.wholeMessage, "it did not finish a message in time");
     }
 }
 
@@ -256,7 +260,7 @@ void BusLink::deliver(sd_bus_message* message)
         const std::lock_guard lock(mutex_);
         number = numberOfReply(message);
         if (number) {
-            const auto& call = pending_.at(*number).call;
+            const auto& call = pendingCall(*number)->call;
             asked.member = call.member;
             asked.outTypes = call.outTypes;
         }
@@ -281,7 +285,7 @@ void BusLink::receive(sd_bus_message* message, Afterwards& afterwards)
             owner->receivedCall(*this, owner->readCall(*this, message), afterwards);
         }
     } else if (const auto number = numberOfReply(message)) {
-        completeCall(*number, readReply(message, pending_.at(*number).call), afterwards);
+        completeCall(*number, readReply(message, pendingCall(*number)->call), afterwards);
     }
 }
 
@@ -294,8 +298,11 @@ std::optional<std::uint64_t> BusLink::numberOfReply(sd_bus_message* message) con
     if (type == SD_BUS_MESSAGE_SIGNAL || sd_bus_message_get_reply_cookie(message, &cookie) < 0) {
         return std::nullopt;
     }
-    const auto number = numberByCookie_.find(cookie);
-    return number == numberByCookie_.end() ? std::nullopt : std::optional(number->second);
+    if (!pending_) {
+        return std::nullopt;
+    }
+    const auto number = pending_->numberByCookie.find(cookie);
+    return number == pending_->numberByCookie.end() ? std::nullopt : std::optional(number->second);
 }
 
 CallResult BusLink::readReply(sd_bus_message* message, const OutgoingCall& call) const

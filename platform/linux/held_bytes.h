@@ -13,7 +13,7 @@ namespace typhon {
 
 /// Counts the memory that peers make this process hold: parts of messages that are not whole yet, arguments
 /// of calls that nobody has answered, and what they leave unread. Any thread.
-class HeldBytes : public std::enable_shared_from_this<HeldBytes> {
+class HeldBytes {
 public:
     HeldBytes(std::size_t perProcess, std::size_t perUser) : perProcess_(perProcess), perUser_(perUser) {}
 

@@ -66,23 +66,11 @@ bool isTransient(int error)
     return error == EAGAIN || error == EINTR;
 }
 
-}  // namespace
-
-MessageReception::Outcome MessageReception::next(int socket)
+/// `begun` when sd-bus must not read what there is.
+MessageReception::Outcome look(const MessageReception::Source& source)
 {
-    if (!begun_) {
-        const auto outcome = look(socket);
-        if (outcome != Outcome::begun) {
-            return outcome;
-        }
-        begun_ = true;
-    }
-    return assemble(socket);
-}
-
-MessageReception::Outcome MessageReception::look(int socket)
-{
-    auto [waiting, descriptors] = peek(socket, smallLook);
+    using Outcome = MessageReception::Outcome;
+    auto [waiting, descriptors] = peek(source.socket, smallLook);
     if (waiting <= 0) {
         return waiting < 0 && isTransient(errno) ? Outcome::nothing : Outcome::closed;
     }
@@ -94,11 +82,11 @@ MessageReception::Outcome MessageReception::look(int socket)
     if (!isWellFormed(header)) {
         return Outcome::malformed;
     }
-    if (size > limits_.bytes) {
+    if (size > source.maximumBytes) {
         return Outcome::tooLarge;
     }
     if (static_cast<std::size_t>(waiting) < size && size <= largeLook) {
-        const auto larger = peek(socket, size);
+        const auto larger = peek(source.socket, size);
         waiting = larger.bytes;
         descriptors = larger.descriptors;
     }
@@ -106,14 +94,28 @@ MessageReception::Outcome MessageReception::look(int socket)
     return isWhole && isPlainMessage(scratch().first(size)) ? Outcome::ready : Outcome::begun;
 }
 
-MessageReception::Outcome MessageReception::assemble(int socket)
+}  // namespace
+
+MessageReception::Outcome MessageReception::next(const Source& source)
+{
+    if (!unfinished_) {
+        const auto outcome = look(source);
+        if (outcome != Outcome::begun) {
+            return outcome;
+        }
+        unfinished_ = std::make_unique<Unfinished>(source);
+    }
+    return assemble(source);
+}
+
+MessageReception::Outcome MessageReception::assemble(const Source& source)
 {
     for (;;) {
-        auto outcome = readMore(socket);
+        auto outcome = readMore(source);
         if (outcome != Outcome::ready) {
             return outcome;
         }
-        outcome = checkSize();
+        outcome = checkSize(source);
         if (outcome != Outcome::begun) {
             return outcome;
         }
@@ -121,25 +123,28 @@ MessageReception::Outcome MessageReception::assemble(int socket)
 }
 
 /// After more bytes have come.
-MessageReception::Outcome MessageReception::checkSize()
+MessageReception::Outcome MessageReception::checkSize(const Source& source)
 {
-    if (size_ == 0 && message_.bytes.size() >= messageHeaderSize) {
-        if (!isWellFormed(message_.bytes)) {
+    const auto& bytes = unfinished_->message.bytes;
+    auto& size = unfinished_->size;
+    if (size == 0 && bytes.size() >= messageHeaderSize) {
+        if (!isWellFormed(bytes)) {
             return Outcome::malformed;
         }
-        size_ = messageSize(message_.bytes);
-        if (size_ > limits_.bytes) {
+        size = messageSize(bytes);
+        if (size > source.maximumBytes) {
             return Outcome::tooLarge;
         }
     }
-    return size_ > 0 && message_.bytes.size() == size_ ? Outcome::assembled : Outcome::begun;
+    return size > 0 && bytes.size() == size ? Outcome::assembled : Outcome::begun;
 }
 
 /// Reads once, never beyond the message's end. `ready` when something has come.
-MessageReception::Outcome MessageReception::readMore(int socket)
+MessageReception::Outcome MessageReception::readMore(const Source& source)
 {
-    auto& bytes = message_.bytes;
-    const auto missing = (size_ > 0 ? static_cast<std::size_t>(size_) : messageHeaderSize) - bytes.size();
+    auto& bytes = unfinished_->message.bytes;
+    const auto size = static_cast<std::size_t>(unfinished_->size);
+    const auto missing = (size > 0 ? size : messageHeaderSize) - bytes.size();
     const auto room = scratch().first(std::min(missing, largeLook));
     iovec part{room.data(), room.size()};
     alignas(cmsghdr) std::array<char, CMSG_SPACE(maximumPassedDescriptors * sizeof(int))> control;
@@ -148,32 +153,33 @@ MessageReception::Outcome MessageReception::readMore(int socket)
     message.msg_iovlen = 1;
     message.msg_control = control.data();
     message.msg_controllen = control.size();
-    const auto got = ::recvmsg(socket, &message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
+    const auto got = ::recvmsg(source.socket, &message, MSG_DONTWAIT | MSG_CMSG_CLOEXEC);
     if (got <= 0) {
         return got < 0 && isTransient(errno) ? Outcome::begun : Outcome::closed;
     }
-    if (!keepDescriptors(message)) {
+    if (!keepDescriptors(message, source.maximumDescriptors)) {
         return Outcome::tooManyDescriptors;
     }
-    if (!held_->grow(static_cast<std::size_t>(got))) {
+    if (!unfinished_->held.grow(static_cast<std::size_t>(got))) {
         return Outcome::tooMuchHeld;
     }
     bytes.insert(bytes.end(), room.begin(), room.begin() + got);
     return Outcome::ready;
 }
 
-bool MessageReception::keepDescriptors(msghdr& message)
+bool MessageReception::keepDescriptors(msghdr& message, std::size_t maximum)
 {
-    std::ranges::move(takeDescriptors(message), std::back_inserter(message_.descriptors));
+    auto& descriptors = unfinished_->message.descriptors;
+    std::ranges::move(takeDescriptors(message), std::back_inserter(descriptors));
     // Truncated: there was no room for more descriptors in the process.
-    const auto limit = descriptorsAllowed_ ? limits_.descriptors : 0;
-    return message_.descriptors.size() <= limit && (message.msg_flags & MSG_CTRUNC) == 0;
+    return descriptors.size() <= maximum && (message.msg_flags & MSG_CTRUNC) == 0;
 }
 
 std::size_t MessageReception::assembledBytes() const
 {
-    auto bytes = message_.bytes.size();
-    for (const auto& descriptor : message_.descriptors) {
+    const auto& message = unfinished_->message;
+    auto bytes = message.bytes.size();
+    for (const auto& descriptor : message.descriptors) {
         struct stat status = {};
         if (::fstat(descriptor.get(), &status) == 0 && S_ISREG(status.st_mode)) {
             bytes += static_cast<std::size_t>(status.st_size);
@@ -184,10 +190,8 @@ std::size_t MessageReception::assembledBytes() const
 
 ReceivedMessage MessageReception::take()
 {
-    begun_ = false;
-    size_ = 0;
-    held_->release();
-    return std::exchange(message_, {});
+    const auto finished = std::move(unfinished_);
+    return finished ? std::move(finished->message) : ReceivedMessage();
 }
 
 }  // namespace typhon

@@ -25,10 +25,15 @@ struct ReceivedMessage {
 /// caller locks.
 class MessageReception {
 public:
-    struct Limits {
-        std::size_t bytes;
+    /// Where messages come from, and what may come from there.
+    struct Source {
+        /// Does not block.
+        int socket;
+        std::size_t maximumBytes;
         /// Of a message that is put together here.
-        std::size_t descriptors;
+        std::size_t maximumDescriptors;
+        const std::shared_ptr<HeldBytes>& heldBytes;
+        const AuditToken& peer;
     };
     enum class Outcome {
         /// There is nothing to read.
@@ -48,31 +53,30 @@ public:
         tooMuchHeld,
     };
 
-    MessageReception(Limits limits, std::unique_ptr<HeldBytes::Claim> held)
-        : limits_(limits), held_(std::move(held))
-    {}
-
-    /// Looks at the input of `socket`, which does not block, or reads more of the message that has begun.
-    Outcome next(int socket);
+    /// Looks at the input, or reads more of the message that has begun.
+    Outcome next(const Source& source);
+    /// The message that was put together, or nothing of the one that has begun: it is forgotten.
     ReceivedMessage take();
     /// Of the message that was put together, and of the files that came with it.
     std::size_t assembledBytes() const;
-    void allowDescriptors(bool allowed) { descriptorsAllowed_ = allowed; }
 
 private:
-    Outcome look(int socket);
-    Outcome assemble(int socket);
-    Outcome checkSize();
-    Outcome readMore(int socket);
-    bool keepDescriptors(msghdr& message);
+    struct Unfinished {
+        explicit Unfinished(const Source& source) : held(source.heldBytes, source.peer) {}
 
-    const Limits limits_;
-    const std::unique_ptr<HeldBytes::Claim> held_;
-    bool descriptorsAllowed_ = true;
-    bool begun_ = false;
-    /// Of the message that has begun, once its header is there.
-    std::uint64_t size_ = 0;
-    ReceivedMessage message_;
+        HeldBytes::Claim held;
+        /// Zero until the header is there.
+        std::uint64_t size = 0;
+        ReceivedMessage message;
+    };
+
+    Outcome assemble(const Source& source);
+    Outcome checkSize(const Source& source);
+    Outcome readMore(const Source& source);
+    bool keepDescriptors(msghdr& message, std::size_t maximum);
+
+    /// The message that has begun. Null mostly.
+    std::unique_ptr<Unfinished> unfinished_;
 };
 
 }  // namespace typhon

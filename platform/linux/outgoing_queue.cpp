@@ -21,41 +21,55 @@ bool hasReadEverything(int socket)
 
 void OutgoingQueue::sending(const MessageAppending& size, int socket)
 {
-    sizes_.push_back(size.bytes + headerBytes);
-    bytes_ += sizes_.back();
     if (size.descriptors > 0) {
         unreadDescriptors_ = (hasReadEverything(socket) ? 0 : unreadDescriptors_) + size.descriptors;
     }
 }
 
-void OutgoingQueue::update(std::uint64_t waiting)
+void OutgoingQueue::sent(const MessageAppending& size, std::uint64_t waiting, const Peer& peer)
 {
-    waiting_ = waiting;
-    while (sizes_.size() > waiting) {
-        bytes_ -= sizes_.front();
-        sizes_.pop_front();
+    if (waiting > 0) {
+        if (!waiting_) {
+            waiting_ = std::make_unique<Waiting>(peer);
+        }
+        waiting_->sizes.push_back(size.bytes + headerBytes);
+        waiting_->bytes += waiting_->sizes.back();
     }
-    // What sd-bus takes for them in memory, with the room that it leaves for more.
-    const auto memory = 2 * bytes_ + sizes_.size() * messageBytes;
-    held_->shrinkTo(memory);
-    tooMuchHeld_ = memory > held_->bytes() && !held_->grow(memory - held_->bytes());
+    update(waiting, peer);
 }
 
-void OutgoingQueue::clear()
+void OutgoingQueue::update(std::uint64_t waiting, const Peer& peer)
 {
-    waiting_ = 0;
-    sizes_.clear();
-    bytes_ = 0;
-    held_->release();
+    if (waiting == 0) {
+        waiting_.reset();
+        return;
+    }
+    if (!waiting_) {
+        waiting_ = std::make_unique<Waiting>(peer);
+    }
+    waiting_->shrinkTo(waiting);
+}
+
+void OutgoingQueue::Waiting::shrinkTo(std::uint64_t waiting)
+{
+    count = waiting;
+    while (sizes.size() > waiting) {
+        bytes -= sizes.front();
+        sizes.pop_front();
+    }
+    // What sd-bus takes for them in memory, with the room that it leaves for more.
+    const auto memory = 2 * bytes + sizes.size() * messageBytes;
+    held.shrinkTo(memory);
+    tooMuchHeld = memory > held.bytes() && !held.grow(memory - held.bytes());
 }
 
 std::string OutgoingQueue::excess(const IpcLimits& limits) const
 {
-    if (bytes_ > limits.queuedBytes || waiting_ > limits.queuedMessages) {
-        return "it left " + std::to_string(waiting_) + " messages of about " + std::to_string(bytes_) +
-               " bytes unread";
+    if (waiting_ && (waiting_->bytes > limits.queuedBytes || waiting_->count > limits.queuedMessages)) {
+        return "it left " + std::to_string(waiting_->count) + " messages of about " +
+               std::to_string(waiting_->bytes) + " bytes unread";
     }
-    if (tooMuchHeld_) {
+    if (waiting_ && waiting_->tooMuchHeld) {
         return "with this its process, or its user, left too much unread";
     }
     if (unreadDescriptors_ > limits.unreadDescriptors) {

@@ -17,24 +17,39 @@ namespace typhon {
 /// descriptors on their way. The caller locks.
 class OutgoingQueue {
 public:
-    explicit OutgoingQueue(std::unique_ptr<HeldBytes::Claim> held) : held_(std::move(held)) {}
-    /// Notes a message that is about to be handed to sd-bus. `socket` is the connection's.
+    /// Who makes us hold what waits.
+    struct Peer {
+        const std::shared_ptr<HeldBytes>& heldBytes;
+        const AuditToken& token;
+    };
+
+    /// Notes the descriptors of a message that is about to be handed to sd-bus. `socket` is the connection's.
     void sending(const MessageAppending& size, int socket);
+    /// Notes the message that was handed over, and how many wait now.
+    void sent(const MessageAppending& size, std::uint64_t waiting, const Peer& peer);
     /// Notes how many messages wait now.
-    void update(std::uint64_t waiting);
-    bool isEmpty() const { return waiting_ == 0; }
-    /// Forgets everything, at the end of the connection.
-    void clear();
+    void update(std::uint64_t waiting, const Peer& peer);
+    bool isEmpty() const { return waiting_ == nullptr; }
+    /// Forgets what waits, at the end of the connection.
+    void clear() { waiting_.reset(); }
     /// Why the peer is not worth waiting for, or empty.
     std::string excess(const IpcLimits& limits) const;
 
 private:
-    const std::unique_ptr<HeldBytes::Claim> held_;
-    bool tooMuchHeld_ = false;
-    std::uint64_t waiting_ = 0;
-    /// Sizes of the latest messages, at least of those that wait and were sent here.
-    std::list<std::size_t> sizes_;
-    std::size_t bytes_ = 0;
+    struct Waiting {
+        explicit Waiting(const Peer& peer) : held(peer.heldBytes, peer.token) {}
+        void shrinkTo(std::uint64_t waiting);
+
+        HeldBytes::Claim held;
+        bool tooMuchHeld = false;
+        std::uint64_t count = 0;
+        /// Of those that were sent here; others are sd-bus's own.
+        std::list<std::size_t> sizes;
+        std::size_t bytes = 0;
+    };
+
+    /// Null mostly: peers read what they are sent.
+    std::unique_ptr<Waiting> waiting_;
     std::size_t unreadDescriptors_ = 0;
 };
 
