@@ -50,7 +50,7 @@ BusLink::BusLink(std::shared_ptr<IpcContext> context, FileDescriptor socket, Rol
 
 BusLink::~BusLink()
 {
-    watch_.reset();
+    watch_ = {};
     context_->dispose(std::move(deadline_));
     context_->dispose(std::move(restTimer_));
 }
@@ -64,21 +64,12 @@ void BusLink::start()
         ::fcntl(socket_.get(), F_SETFL, O_NONBLOCK);
         handshake_ = newHandshake(role_);
         startDeadline(context_->limits.handshake, "it did not finish the handshake in time");
-        watch(socket_.get());
+        watch_ = context_->pool.watch(socket_.get(), weak_from_this());
         const auto pause = context_->pace.restAfterConnecting(peer, std::chrono::steady_clock::now());
         if (pause > std::chrono::nanoseconds::zero()) {
             rest(pause);
         } else {
             proceedWithHandshake(afterwards);
-        }
-    });
-}
-
-void BusLink::watch(int descriptor)
-{
-    watch_ = context_->pool.watch(descriptor, [weak = weak_from_this()](std::uint32_t events) {
-        if (const auto self = weak.lock()) {
-            self->handleEvents(events);
         }
     });
 }
@@ -93,7 +84,7 @@ void BusLink::arm()
     auto events = ready_ ? static_cast<std::uint32_t>(sd_bus_get_events(bus_.get())) : EPOLLIN;
     events &= inputHeld_ ? ~std::uint32_t{EPOLLIN} : ~std::uint32_t{};
     if (events != 0) {
-        watch_->arm(events);
+        watch_.arm(events);
     }
 }
 
@@ -114,7 +105,7 @@ void BusLink::becomeReady(Afterwards& afterwards)
     descriptorsAllowed_ = handshake_->descriptorsAgreed();
     handshake_.reset();
     context_->dispose(std::move(deadline_));
-    watch_.reset();
+    watch_ = {};
     int result = bus_.open(descriptorsAllowed_);
     if (result >= 0) {
         result = bus_.moveOnto(std::move(socket_));
@@ -125,7 +116,7 @@ void BusLink::becomeReady(Afterwards& afterwards)
         return;
     }
     ready_ = true;
-    watch(bus_.socket());
+    watch_ = context_->pool.watch(bus_.socket(), weak_from_this());
     arm();
     std::vector<std::uint64_t> waiting;
     if (pending_) {
@@ -366,7 +357,7 @@ void BusLink::end(Afterwards& afterwards, bool tellOwner)
     if (std::exchange(ended_, true)) {
         return;
     }
-    watch_.reset();
+    watch_ = {};
     context_->dispose(std::move(deadline_));
     context_->dispose(std::move(restTimer_));
     reception_.take();

@@ -28,7 +28,7 @@ namespace typhon {
 /// One sd-bus object over one connected socket, from the handshake to the end: reads when the socket is
 /// ready, writes from any thread, matches replies to calls, and closes itself when a limit is exceeded. Any
 /// thread.
-class BusLink : public std::enable_shared_from_this<BusLink> {
+class BusLink : public EventPool::Handler, public std::enable_shared_from_this<BusLink> {
 public:
     enum class Role { server, client };
     /// What is left to do once the lock is released.
@@ -62,7 +62,7 @@ public:
 
     BusLink(std::shared_ptr<IpcContext> context, FileDescriptor socket, Role role, AuditToken peer,
             std::weak_ptr<Owner> owner);
-    ~BusLink();
+    ~BusLink() override;
 
     /// Begins the handshake; the owner is told when that fails.
     void start();
@@ -85,6 +85,8 @@ public:
     /// Closes for a reason that is nobody's fault, or of no interest.
     void abandonLocked(const std::string& reason, Afterwards& afterwards);
 
+    void handleEvents(std::uint32_t events) override;
+
     const AuditToken peer;
 
 private:
@@ -104,7 +106,6 @@ private:
     /// What is to be done after something was read.
     enum class Next { wait, read, decode };
 
-    void handleEvents(std::uint32_t events);
     Next handleInput(std::uint32_t events, Afterwards& afterwards);
     Next processInput(Afterwards& afterwards);
     void processReadyMessage(Afterwards& afterwards);
@@ -120,7 +121,6 @@ private:
     void proceedWithHandshake(Afterwards& afterwards);
     void becomeReady(Afterwards& afterwards);
     void processOutput(Afterwards& afterwards);
-    void watch(int descriptor);
     void startDeadline(std::chrono::nanoseconds delay, const char* offence);
     void receive(sd_bus_message* message, Afterwards& afterwards);
     std::optional<std::uint64_t> numberOfReply(sd_bus_message* message) const;
@@ -149,7 +149,7 @@ private:
     FileDescriptor socket_;
     std::unique_ptr<Handshake> handshake_;
     OpenedBus bus_;
-    std::unique_ptr<EventPool::Watch> watch_;
+    EventPool::HandlerWatch watch_;
     /// For the handshake, later for the message that has begun.
     std::unique_ptr<Timer> deadline_;
     std::unique_ptr<Timer> restTimer_;

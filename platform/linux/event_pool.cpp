@@ -14,38 +14,27 @@ namespace typhon {
 
 namespace {
 
-class PoolWatch final : public EventPool::Watch {
+class FunctionHandler final : public EventPool::Handler {
 public:
-    PoolWatch(std::shared_ptr<EventPool::Impl> pool, int descriptor, std::uint64_t id)
-        : pool_(std::move(pool)), descriptor_(descriptor), id_(id)
-    {}
-    ~PoolWatch() override
-    {
-        if (added_) {
-            epoll_ctl(pool_->epoll(), EPOLL_CTL_DEL, descriptor_, nullptr);
-        }
-        pool_->remove(id_);
-    }
+    explicit FunctionHandler(std::function<void(std::uint32_t)> function) : function_(std::move(function)) {}
+    void handleEvents(std::uint32_t events) override { function_(events); }
 
+private:
+    const std::function<void(std::uint32_t)> function_;
+};
+
+class FunctionWatch final : public EventPool::Watch {
+public:
+    explicit FunctionWatch(EventPool::HandlerWatch watch) : watch_(std::move(watch)) {}
     void arm(std::uint32_t events) override
     {
         const std::lock_guard lock(mutex_);
-        epoll_event event{};
-        event.events = events | EPOLLONESHOT;
-        event.data.u64 = id_;
-        // Added with the first arming only: epoll reports errors and hang-ups whether asked for or not.
-        const int operation = std::exchange(added_, true) ? EPOLL_CTL_MOD : EPOLL_CTL_ADD;
-        if (epoll_ctl(pool_->epoll(), operation, descriptor_, &event) < 0) {
-            throw std::system_error(errno, std::generic_category(), "epoll_ctl");
-        }
+        watch_.arm(events);
     }
 
 private:
-    const std::shared_ptr<EventPool::Impl> pool_;
-    const int descriptor_;
-    const std::uint64_t id_;
     std::mutex mutex_;
-    bool added_ = false;
+    EventPool::HandlerWatch watch_;
 };
 
 EventPool::Options sane(EventPool::Options options)
@@ -56,6 +45,40 @@ EventPool::Options sane(EventPool::Options options)
 }
 
 }  // namespace
+
+EventPool::HandlerWatch::HandlerWatch(std::shared_ptr<Impl> pool, int descriptor, std::uint64_t id)
+    : pool_(std::move(pool)), id_(id), descriptor_(descriptor)
+{}
+
+EventPool::HandlerWatch::~HandlerWatch()
+{
+    if (added_) {
+        epoll_ctl(pool_->epoll(), EPOLL_CTL_DEL, descriptor_, nullptr);
+    }
+    if (pool_) {
+        pool_->remove(id_);
+    }
+}
+
+void EventPool::HandlerWatch::swap(HandlerWatch& other) noexcept
+{
+    pool_.swap(other.pool_);
+    std::swap(id_, other.id_);
+    std::swap(descriptor_, other.descriptor_);
+    std::swap(added_, other.added_);
+}
+
+void EventPool::HandlerWatch::arm(std::uint32_t events)
+{
+    epoll_event event{};
+    event.events = events | EPOLLONESHOT;
+    event.data.u64 = id_;
+    // Added with the first arming only: epoll reports errors and hang-ups whether asked for or not.
+    const int operation = std::exchange(added_, true) ? EPOLL_CTL_MOD : EPOLL_CTL_ADD;
+    if (epoll_ctl(pool_->epoll(), operation, descriptor_, &event) < 0) {
+        throw std::system_error(errno, std::generic_category(), "epoll_ctl");
+    }
+}
 
 EventPool::EventPool(Options options) : impl_(std::make_shared<Impl>(sane(options)))
 {
@@ -79,7 +102,13 @@ void EventPool::post(std::function<void()> job)
 
 std::unique_ptr<EventPool::Watch> EventPool::watch(int descriptor, std::function<void(std::uint32_t)> handler)
 {
-    return std::make_unique<PoolWatch>(impl_, descriptor, impl_->add(std::move(handler)));
+    std::shared_ptr<Handler> kept = std::make_shared<FunctionHandler>(std::move(handler));
+    return std::make_unique<FunctionWatch>(HandlerWatch(impl_, descriptor, impl_->add(std::move(kept))));
+}
+
+EventPool::HandlerWatch EventPool::watch(int descriptor, std::weak_ptr<Handler> handler)
+{
+    return HandlerWatch(impl_, descriptor, impl_->add(std::move(handler)));
 }
 
 unsigned EventPool::threadCount() const

@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <utility>
 
 namespace typhon {
 
@@ -26,6 +27,41 @@ public:
         virtual void arm(std::uint32_t events) = 0;
     };
 
+    class Impl;
+
+    /// An object that events of a descriptor are reported to.
+    class Handler {
+    public:
+        virtual ~Handler() = default;
+        /// On a pool thread.
+        virtual void handleEvents(std::uint32_t events) = 0;
+    };
+
+    /// A watch for handlers that are there in thousands: a part of them. Watches nothing at first. The caller
+    /// locks.
+    class HandlerWatch {
+    public:
+        HandlerWatch() = default;
+        HandlerWatch(std::shared_ptr<Impl> pool, int descriptor, std::uint64_t id);
+        HandlerWatch(HandlerWatch&& other) noexcept { swap(other); }
+        HandlerWatch& operator=(HandlerWatch&& other) noexcept
+        {
+            HandlerWatch(std::move(other)).swap(*this);
+            return *this;
+        }
+        ~HandlerWatch();
+        void arm(std::uint32_t events);
+
+    private:
+        void swap(HandlerWatch& other) noexcept;
+
+        /// Null when nothing is watched.
+        std::shared_ptr<Impl> pool_;
+        std::uint64_t id_ = 0;
+        int descriptor_ = -1;
+        bool added_ = false;
+    };
+
     explicit EventPool(Options options);
     EventPool() : EventPool(Options{}) {}
     /// Stops.
@@ -44,14 +80,14 @@ public:
     /// Watches a descriptor, which outlives the watch. Not armed yet. `handler` gets the epoll events, on a
     /// pool thread.
     std::unique_ptr<Watch> watch(int descriptor, std::function<void(std::uint32_t)> handler);
+    /// The same with an object that is not kept alive. While it handles an event it is.
+    HandlerWatch watch(int descriptor, std::weak_ptr<Handler> handler);
 
     /// Threads running at present, and the most there may be.
     unsigned threadCount() const;
     unsigned maximumThreads() const;
     /// True on a thread of this pool.
     bool isPoolThread() const;
-
-    class Impl;
 
 private:
     std::shared_ptr<Impl> impl_;

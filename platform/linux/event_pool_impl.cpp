@@ -63,6 +63,15 @@ void requestShortTurns()
     }
 }
 
+/// Null when it is gone.
+std::shared_ptr<EventPool::Handler> strong(const EventPool::Impl::HeldHandler& handler)
+{
+    if (const auto* kept = std::get_if<std::shared_ptr<EventPool::Handler>>(&handler)) {
+        return *kept;
+    }
+    return std::get<std::weak_ptr<EventPool::Handler>>(handler).lock();
+}
+
 int checked(int result, const char* what)
 {
     if (result < 0) {
@@ -132,10 +141,10 @@ void EventPool::Impl::post(Job job)
     wakeOne(lock);
 }
 
-std::uint64_t EventPool::Impl::add(Handler handler)
+std::uint64_t EventPool::Impl::add(HeldHandler handler)
 {
     const std::lock_guard lock(mutex_);
-    handlers_.emplace(nextId_, std::make_shared<Handler>(std::move(handler)));
+    handlers_.emplace(nextId_, std::move(handler));
     return nextId_++;
 }
 
@@ -221,13 +230,13 @@ void EventPool::Impl::dispatch(std::uint64_t id, std::uint32_t events)
     {
         std::unique_lock lock(mutex_);
         const auto found = handlers_.find(id);
-        if (found == handlers_.end() || stopping_) {
+        handler = found == handlers_.end() || stopping_ ? nullptr : strong(found->second);
+        if (!handler) {
             return;
         }
-        handler = found->second;
         beginWork(lock);
     }
-    (*handler)(events);
+    handler->handleEvents(events);
     handler.reset();
     endWork();
 }

@@ -9,6 +9,7 @@
 #include <memory>
 #include <mutex>
 #include <unordered_map>
+#include <variant>
 #include <vector>
 
 #include <pthread.h>
@@ -19,7 +20,8 @@ namespace typhon {
 class EventPool::Impl : public std::enable_shared_from_this<EventPool::Impl> {
 public:
     using Job = std::function<void()>;
-    using Handler = std::function<void(std::uint32_t)>;
+    /// Kept alive by others, or by the pool.
+    using HeldHandler = std::variant<std::weak_ptr<Handler>, std::shared_ptr<Handler>>;
 
     explicit Impl(Options options);
 
@@ -29,7 +31,7 @@ public:
     void post(Job job);
 
     /// The identifier under which events of a new watch arrive; never used again.
-    std::uint64_t add(Handler handler);
+    std::uint64_t add(HeldHandler handler);
     void remove(std::uint64_t id);
     int epoll() const { return epoll_.get(); }
 
@@ -57,7 +59,7 @@ private:
     mutable std::mutex mutex_;
     // All below is protected by mutex_.
     std::deque<Job> jobs_;
-    std::unordered_map<std::uint64_t, std::shared_ptr<Handler>> handlers_;
+    std::unordered_map<std::uint64_t, HeldHandler> handlers_;
     std::uint64_t nextId_;
     std::vector<pthread_t> handles_;
     unsigned threads_ = 0;

@@ -236,6 +236,38 @@ TEST(EventPool, handlerOwnsItsStateWhileWatchesAreDestroyedUnderIt)
     EXPECT_LE(calls, 500);
 }
 
+TEST(EventPool, handlerObjectIsCalledAsLongAsItIsThere)
+{
+    struct Counter final : EventPool::Handler {
+        Counter(Count& calls, Count& ends) : called(calls), ended(ends) {}
+        ~Counter() override { ended.add(1); }
+        void handleEvents(std::uint32_t) override { called.add(1); }
+        Count& called;
+        Count& ended;
+    };
+    EventPool pool;
+    Count called;
+    Count ended;
+    const Pair pair;
+    auto handler = std::make_shared<Counter>(called, ended);
+    auto watch = pool.watch(pair.near.get(), handler);
+    watch.arm(EPOLLIN);
+    pair.write("x");
+    ASSERT_TRUE(called.waitFor(1));
+    handler.reset();
+    ASSERT_TRUE(ended.waitFor(1));
+    watch.arm(EPOLLIN);
+    const Pair other;
+    Count turns;
+    const auto turn = pool.watch(other.near.get(), [&turns](std::uint32_t) { turns.add(1); });
+    turn->arm(EPOLLIN);
+    other.write("x");
+    ASSERT_TRUE(turns.waitFor(1));
+    watch = {};
+    pool.stop();
+    EXPECT_EQ(called.value(), 1);
+}
+
 TEST(EventPool, reusedDescriptorGetsNoEventsOfTheEarlierOne)
 {
     EventPool pool;
