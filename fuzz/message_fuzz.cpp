@@ -99,7 +99,7 @@ private:
     {
         static const auto held = std::make_shared<HeldBytes>(1U << 20, 1U << 20);
         static const AuditToken peer;
-        return {bus_.socket(), largestMessage, 3, held, peer};
+        return {bus_.socket(), largestMessage, 3, {held, peer}};
     }
     static int keep(sd_bus_message* message, void* peer, sd_bus_error*)
     {

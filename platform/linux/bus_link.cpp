@@ -247,7 +247,7 @@ bool BusLink::send(BusMessage message, const MessageAppending& size, std::uint64
         abandonLocked("a message could not be sent: " + errorText(result), afterwards);
         return false;
     }
-    outgoing_.sent(size, countWaiting(), outgoingPeer());
+    outgoing_.sent(size, countWaiting(), holder());
     checkExcess(afterwards);
     if (!ended_ && !outgoing_.isEmpty()) {
         arm();

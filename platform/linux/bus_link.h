@@ -134,7 +134,7 @@ private:
     BusMessage callToAnswer(std::uint64_t cookie);
     void checkExcess(Afterwards& afterwards);
     std::uint64_t countWaiting() const;
-    OutgoingQueue::Peer outgoingPeer() const { return {context_->heldBytes, peer}; }
+    HeldBytes::Peer holder() const { return {context_->heldBytes, peer}; }
     void arm();
     void end(Afterwards& afterwards, bool tellOwner);
     std::unique_ptr<Timer> startTimer(std::chrono::nanoseconds delay, std::function<void(BusLink&)> handler);

@@ -135,7 +135,7 @@ BusLink::Next BusLink::handleInput(std::uint32_t events, Afterwards& afterwards)
     }
     const auto next = ended_ || inputHeld_ ? Next::wait : processInput(afterwards);
     if (!ended_) {
-        outgoing_.update(countWaiting(), outgoingPeer());
+        outgoing_.update(countWaiting(), holder());
         checkExcess(afterwards);
     }
     return ended_ ? Next::wait : next;
@@ -146,9 +146,8 @@ BusLink::Next BusLink::processInput(Afterwards& afterwards)
 {
     using Outcome = MessageReception::Outcome;
     const auto& limits = context_->limits.message;
-    const auto outcome =
-        reception_.next({bus_.socket(), limits.bytes, descriptorsAllowed_ ? limits.descriptors : 0,
-                         context_->heldBytes, peer});
+    const auto outcome = reception_.next(
+        {bus_.socket(), limits.bytes, descriptorsAllowed_ ? limits.descriptors : 0, holder()});
     if (outcome == Outcome::ready) {
         processReadyMessage(afterwards);
         return Next::read;

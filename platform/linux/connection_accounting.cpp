@@ -5,23 +5,22 @@ namespace typhon {
 ConnectionAccounting::Admission ConnectionAccounting::admit(const AuditToken& token)
 {
     const std::lock_guard lock(mutex_);
-    auto& process = processes_[{token.processIdentifier, token.processInstance}];
-    auto& user = users_[token.effectiveUser];
-    auto refusal = refuse(process, perProcess_, "process " + std::to_string(token.processIdentifier));
+    const ProcessKey key{token.processIdentifier, token.processInstance};
+    const auto process = processes_.try_emplace(key).first;
+    const auto user = users_.try_emplace(token.effectiveUser).first;
+    auto refusal = refuse(process->second, perProcess_, "process " + std::to_string(token.processIdentifier));
     if (!refusal) {
-        refusal = refuse(user, perUser_, "user " + std::to_string(token.effectiveUser));
+        refusal = refuse(user->second, perUser_, "user " + std::to_string(token.effectiveUser));
     }
     if (refusal) {
-        if (process.connections == 0) {
-            processes_.erase({token.processIdentifier, token.processInstance});
+        if (process->second.connections == 0) {
+            processes_.erase(process);
         }
-        return {nullptr, *refusal};
+        return {{}, *refusal};
     }
-    ++process.connections;
-    ++user.connections;
-    return {std::make_unique<Charge>(shared_from_this(), token), {}};
-    // The analyzer loses sight of the pointer inside the returned aggregate.
-    // NOLINTNEXTLINE(clang-analyzer-cplusplus.NewDeleteLeaks)
+    ++process->second.connections;
+    ++user->second.connections;
+    return {Charge(shared_from_this(), process, user), {}};
 }
 
 std::optional<std::string> ConnectionAccounting::refuse(Account& account, unsigned limit,
@@ -36,14 +35,12 @@ std::optional<std::string> ConnectionAccounting::refuse(Account& account, unsign
     return who + " has " + std::to_string(account.connections) + " connections; further ones are refused";
 }
 
-void ConnectionAccounting::release(const AuditToken& token)
+void ConnectionAccounting::release(Processes::iterator process, Users::iterator user)
 {
     const std::lock_guard lock(mutex_);
-    const auto process = processes_.find({token.processIdentifier, token.processInstance});
     if (--process->second.connections == 0) {
         processes_.erase(process);
     }
-    const auto user = users_.find(token.effectiveUser);
     if (--user->second.connections == 0) {
         users_.erase(user);
     }

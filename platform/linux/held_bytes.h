@@ -17,11 +17,16 @@ class HeldBytes {
 public:
     HeldBytes(std::size_t perProcess, std::size_t perUser) : perProcess_(perProcess), perUser_(perUser) {}
 
+    /// Who makes us hold something, and where that counts.
+    struct Peer {
+        const std::shared_ptr<HeldBytes>& held;
+        const AuditToken& token;
+    };
+
     /// What is held for one connection; given back when it is destroyed.
     class Claim {
     public:
-        Claim(std::shared_ptr<HeldBytes> held, const AuditToken& peer) : held_(std::move(held)), peer_(peer)
-        {}
+        explicit Claim(const Peer& peer) : held_(peer.held), peer_(peer.token) {}
         ~Claim() { release(); }
         Claim(const Claim&) = delete;
         Claim& operator=(const Claim&) = delete;

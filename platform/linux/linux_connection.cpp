@@ -27,12 +27,11 @@ void run(const BusLink::Afterwards& afterwards)
 }  // namespace
 
 LinuxConnection::LinuxConnection(std::shared_ptr<IpcContext> context, Lifetime lifetime, Connector connector,
-                                 AuditToken peer, std::unique_ptr<ConnectionAccounting::Charge> charge)
-    : context_(std::move(context)), lifetime_(lifetime),
+                                 AuditToken peer, ConnectionAccounting::Charge charge)
+    : context_(std::move(context)),
       queue_(context_->queues.createSerialQueue("com.vorlan.typhond.connection")),
-      unanswered_(std::make_shared<UnansweredCalls>(context_->limits.unansweredCalls,
-                                                    context_->limits.unansweredBytes)),
-      connector_(std::move(connector)), charge_(std::move(charge)), peer_(peer)
+      dialling_(std::make_shared<Dialling>(std::move(connector))), charge_(std::move(charge)), peer_(peer),
+      lifetime_(lifetime)
 {}
 
 LinuxConnection::~LinuxConnection()
@@ -81,7 +80,9 @@ void LinuxConnection::setInvalidationHandler(std::function<void()> handler)
 void LinuxConnection::setInterruptionHandler(std::function<void()> handler)
 {
     const std::lock_guard lock(mutex_);
-    interruptionHandler_.swap(handler);
+    if (dialling_) {
+        dialling_->interruptionHandler.swap(handler);
+    }
 }
 
 void LinuxConnection::resume()
@@ -102,26 +103,33 @@ void LinuxConnection::resume()
 
 std::shared_ptr<BusLink> LinuxConnection::usableLink()
 {
-    std::unique_lock connecting(connecting_);
+    std::shared_ptr<Dialling> dialling;
     {
         const std::lock_guard lock(mutex_);
         if (!resumed_ || ended_ || link_) {
             return link_;
         }
+        dialling = dialling_;
     }
-    std::unique_ptr<ConnectionAccounting::Charge> charge;
-    auto link = connect(charge);
+    std::unique_lock connecting(dialling->connecting);
+    {
+        const std::lock_guard lock(mutex_);
+        if (ended_ || link_) {
+            return link_;
+        }
+    }
+    ConnectionAccounting::Charge charge;
+    auto link = connect(dialling->connector, charge);
     if (!link) {
         return nullptr;
     }
-    Connector used;
     {
         const std::lock_guard lock(mutex_);
         if (ended_) {
             return nullptr;
         }
         if (lifetime_ == Lifetime::oneSocket) {
-            used.swap(connector_);
+            dialling_.reset();
         }
         link_ = link;
         peer_ = link->peer;
@@ -134,13 +142,9 @@ std::shared_ptr<BusLink> LinuxConnection::usableLink()
     return link;
 }
 
-std::shared_ptr<BusLink> LinuxConnection::connect(std::unique_ptr<ConnectionAccounting::Charge>& charge)
+std::shared_ptr<BusLink> LinuxConnection::connect(const Connector& connector,
+                                                  ConnectionAccounting::Charge& charge)
 {
-    Connector connector;
-    {
-        const std::lock_guard lock(mutex_);
-        connector = connector_;
-    }
     auto connected = connector ? connector() : ConnectedSocket{};
     if (!connected.socket) {
         TYLog_Debug(context_->log, "cannot connect: " + connected.problem);
@@ -186,8 +190,8 @@ void LinuxConnection::linkClosed(BusLink& link, BusLink::Afterwards& afterwards)
         if (lifetime_ == Lifetime::oneSocket) {
             ended_ = true;
             item = runInvalidation;
-        } else if (interruptionHandler_) {
-            item = [handler = interruptionHandler_](Self self) {
+        } else if (dialling_ && dialling_->interruptionHandler) {
+            item = [handler = dialling_->interruptionHandler](Self self) {
                 return connection_work::runCallback(self->context_->log, handler);
             };
         }
@@ -206,24 +210,22 @@ void LinuxConnection::linkClosed(BusLink& link, BusLink::Afterwards& afterwards)
 Task<void> LinuxConnection::runInvalidation(Self self)
 {
     std::function<void()> invalidation;
-    std::function<void()> interruption;
     std::shared_ptr<ExportedObject> object;
-    std::unique_ptr<ConnectionAccounting::Charge> charge;
-    Connector connector;
+    ConnectionAccounting::Charge charge;
+    std::shared_ptr<Dialling> dialling;
     {
         const std::lock_guard lock(self->mutex_);
         invalidation.swap(self->invalidationHandler_);
-        charge.swap(self->charge_);
-        connector.swap(self->connector_);
+        charge = std::move(self->charge_);
+        dialling.swap(self->dialling_);
     }
     releaseProcess(self->auditToken());
-    charge.reset();
+    charge = {};
     if (invalidation) {
         Task<void> running = connection_work::runCallback(self->context_->log, std::move(invalidation));
         co_await std::move(running);
     }
     const std::lock_guard lock(self->mutex_);
-    interruption.swap(self->interruptionHandler_);
     object.swap(self->object_);
 }
 

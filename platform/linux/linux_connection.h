@@ -20,8 +20,8 @@ struct ConnectedSocket {
     AuditToken peer;
     BusLink::Role role = BusLink::Role::client;
     std::string problem;
-    /// Given back when the connection ends; null where the peer is not charged for it.
-    std::unique_ptr<ConnectionAccounting::Charge> charge = nullptr;
+    /// Given back when the connection ends; empty where the peer is not charged for it.
+    ConnectionAccounting::Charge charge = {};
 };
 
 /// A connection over Unix sockets: dispatches what its link reads to the exported object, in order, as items
@@ -36,7 +36,7 @@ public:
 
     /// `peer` as far as it is known already; `charge` is given back when the connection ends.
     LinuxConnection(std::shared_ptr<IpcContext> context, Lifetime lifetime, Connector connector,
-                    AuditToken peer = {}, std::unique_ptr<ConnectionAccounting::Charge> charge = nullptr);
+                    AuditToken peer = {}, ConnectionAccounting::Charge charge = {});
     ~LinuxConnection() override;
 
     AuditToken auditToken() const override;
@@ -64,9 +64,19 @@ private:
     using Self = std::shared_ptr<LinuxConnection>;
     /// What waits for its turn on the queue. It holds no connection, so that one that never runs keeps none.
     using Item = std::function<Task<void>(Self)>;
+    /// What a connection has until it has its socket, and one to a service for good.
+    struct Dialling {
+        explicit Dialling(Connector function) : connector(std::move(function)) {}
+
+        const Connector connector;
+        /// Held while connecting, so that a service is connected to once.
+        std::mutex connecting;
+        /// Protected by the connection's mutex.
+        std::function<void()> interruptionHandler;
+    };
 
     std::shared_ptr<BusLink> usableLink();
-    std::shared_ptr<BusLink> connect(std::unique_ptr<ConnectionAccounting::Charge>& charge);
+    std::shared_ptr<BusLink> connect(const Connector& connector, ConnectionAccounting::Charge& charge);
     void startCall(std::string_view interface, std::string_view member, Arguments arguments, bool expectReply,
                    std::int64_t timeout, BusLink::Completion completion);
     static void answerOther(BusLink& link, const ReceivedCall& call, BusLink::Afterwards& afterwards);
@@ -83,25 +93,23 @@ private:
                                   std::int64_t timeout);
 
     const std::shared_ptr<IpcContext> context_;
-    const Lifetime lifetime_;
     const std::shared_ptr<WorkQueue> queue_;
-    const std::shared_ptr<UnansweredCalls> unanswered_;
-    /// Held while connecting, so that a service is connected to once.
-    std::mutex connecting_;
+    /// Used under the link's lock.
+    UnansweredCalls unanswered_;
 
     /// Innermost: no other lock is taken under it.
     mutable std::mutex mutex_;
     // Below: protected by `mutex_`.
-    Connector connector_;
-    std::unique_ptr<ConnectionAccounting::Charge> charge_;
+    std::shared_ptr<Dialling> dialling_;
+    ConnectionAccounting::Charge charge_;
     AuditToken peer_;
     InterfaceDescriptions exported_;
     InterfaceDescriptions remote_;
     std::shared_ptr<ExportedObject> object_;
     std::function<void()> invalidationHandler_;
-    std::function<void()> interruptionHandler_;
     std::shared_ptr<BusLink> link_;
     std::list<Item> inbox_;
+    const Lifetime lifetime_;
     bool resumed_ = false;
     bool ended_ = false;
     bool invalidatedHere_ = false;

@@ -34,8 +34,8 @@ void LinuxConnection::receivedCall(BusLink& link, ReceivedCall call, BusLink::Af
         }
         return;
     }
-    auto charge = unanswered_->charge(call.reading.memory,
-                                      std::make_unique<HeldBytes::Claim>(context_->heldBytes, link.peer));
+    auto charge = UnansweredCalls::charge({shared_from_this(), &unanswered_}, call.reading.memory,
+                                          context_->limits, {context_->heldBytes, link.peer});
     if (!charge) {
         refuseExcess(link, call, afterwards);
         return;

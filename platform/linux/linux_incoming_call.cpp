@@ -29,16 +29,18 @@ void LinuxIncomingCall::fail(IpcError error)
 
 void LinuxIncomingCall::handled()
 {
+    std::unique_ptr<UnansweredCalls::Charge> over;
     const std::lock_guard lock(mutex_);
     if (!operation_.member.replies || !origin_.replyExpected) {
-        charge_.reset();
+        over = std::move(charge_);
     }
 }
 
 std::shared_ptr<BusLink> LinuxIncomingCall::takeAnswer()
 {
+    std::unique_ptr<UnansweredCalls::Charge> over;
     const std::lock_guard lock(mutex_);
-    charge_.reset();
+    over = std::move(charge_);
     const bool first = !std::exchange(answered_, true);
     return first && origin_.replyExpected ? origin_.link.lock() : nullptr;
 }

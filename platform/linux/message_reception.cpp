@@ -103,7 +103,7 @@ MessageReception::Outcome MessageReception::next(const Source& source)
         if (outcome != Outcome::begun) {
             return outcome;
         }
-        unfinished_ = std::make_unique<Unfinished>(source);
+        unfinished_ = std::make_unique<Unfinished>(source.peer);
     }
     return assemble(source);
 }

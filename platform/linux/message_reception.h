@@ -32,8 +32,7 @@ public:
         std::size_t maximumBytes;
         /// Of a message that is put together here.
         std::size_t maximumDescriptors;
-        const std::shared_ptr<HeldBytes>& heldBytes;
-        const AuditToken& peer;
+        HeldBytes::Peer peer;
     };
     enum class Outcome {
         /// There is nothing to read.
@@ -62,7 +61,7 @@ public:
 
 private:
     struct Unfinished {
-        explicit Unfinished(const Source& source) : held(source.heldBytes, source.peer) {}
+        explicit Unfinished(const HeldBytes::Peer& peer) : held(peer) {}
 
         HeldBytes::Claim held;
         /// Zero until the header is there.

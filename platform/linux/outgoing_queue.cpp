@@ -26,7 +26,7 @@ void OutgoingQueue::sending(const MessageAppending& size, int socket)
     }
 }
 
-void OutgoingQueue::sent(const MessageAppending& size, std::uint64_t waiting, const Peer& peer)
+void OutgoingQueue::sent(const MessageAppending& size, std::uint64_t waiting, const HeldBytes::Peer& peer)
 {
     if (waiting > 0) {
         if (!waiting_) {
@@ -38,7 +38,7 @@ void OutgoingQueue::sent(const MessageAppending& size, std::uint64_t waiting, co
     update(waiting, peer);
 }
 
-void OutgoingQueue::update(std::uint64_t waiting, const Peer& peer)
+void OutgoingQueue::update(std::uint64_t waiting, const HeldBytes::Peer& peer)
 {
     if (waiting == 0) {
         waiting_.reset();

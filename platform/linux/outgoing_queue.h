@@ -17,18 +17,12 @@ namespace typhon {
 /// descriptors on their way. The caller locks.
 class OutgoingQueue {
 public:
-    /// Who makes us hold what waits.
-    struct Peer {
-        const std::shared_ptr<HeldBytes>& heldBytes;
-        const AuditToken& token;
-    };
-
     /// Notes the descriptors of a message that is about to be handed to sd-bus. `socket` is the connection's.
     void sending(const MessageAppending& size, int socket);
     /// Notes the message that was handed over, and how many wait now.
-    void sent(const MessageAppending& size, std::uint64_t waiting, const Peer& peer);
+    void sent(const MessageAppending& size, std::uint64_t waiting, const HeldBytes::Peer& peer);
     /// Notes how many messages wait now.
-    void update(std::uint64_t waiting, const Peer& peer);
+    void update(std::uint64_t waiting, const HeldBytes::Peer& peer);
     bool isEmpty() const { return waiting_ == nullptr; }
     /// Forgets what waits, at the end of the connection.
     void clear() { waiting_.reset(); }
@@ -37,7 +31,7 @@ public:
 
 private:
     struct Waiting {
-        explicit Waiting(const Peer& peer) : held(peer.heldBytes, peer.token) {}
+        explicit Waiting(const HeldBytes::Peer& peer) : held(peer) {}
         void shrinkTo(std::uint64_t waiting);
 
         HeldBytes::Claim held;
