@@ -109,6 +109,7 @@ private:
     std::function<void()> invalidationHandler_;
     std::shared_ptr<BusLink> link_;
     std::list<Item> inbox_;
+    /// Constant.
     const Lifetime lifetime_;
     bool resumed_ = false;
     bool ended_ = false;

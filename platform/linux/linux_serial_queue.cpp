@@ -46,7 +46,7 @@ void LinuxSerialQueue::start(Task<void> body, WorkItem* awaitedBy, std::shared_p
         return;
     }
     if (running_) {
-        waiting_.push_back(std::move(item));
+        line().items.push_back(std::move(item));
         return;
     }
     ready_ = item->root();
@@ -75,7 +75,7 @@ void LinuxSerialQueue::sync(const std::function<void()>& work)
     {
         Lock lock(mutex_);
         if (running_) {
-            waiting_.push_back(item);
+            line().items.push_back(item);
             waitForTurn(lock, item);
         } else if (!closed_) {
             running_ = item;
@@ -92,25 +92,41 @@ void LinuxSerialQueue::sync(const std::function<void()>& work)
 void LinuxSerialQueue::waitForTurn(Lock& lock, const std::shared_ptr<LinuxWorkItem>& item)
 {
     const bool canHelp = executor_->isCurrentThread();
-    ++waitingThreads_;
-    if (!turn_) {
-        turn_ = std::make_unique<std::condition_variable>();
-    }
+    auto& waiting = line();
+    ++waiting.threads;
     while (running_ != item && !closed_) {
         if (canHelp && ready_ && !sliceRuns_) {
             runSlice(lock);
         } else {
-            turn_->wait(lock);
+            waiting.turn.wait(lock);
         }
     }
-    --waitingThreads_;
+    --waiting.threads;
+    dropEmptyLine();
+}
+
+/// The caller holds the mutex.
+LinuxSerialQueue::Line& LinuxSerialQueue::line()
+{
+    if (!line_) {
+        line_ = std::make_unique<Line>();
+    }
+    return *line_;
+}
+
+/// The caller holds the mutex.
+void LinuxSerialQueue::dropEmptyLine()
+{
+    if (line_ && line_->items.empty() && line_->threads == 0) {
+        line_.reset();
+    }
 }
 
 /// The caller holds the mutex.
 void LinuxSerialQueue::wakeWaiting()
 {
-    if (turn_) {
-        turn_->notify_all();
+    if (line_) {
+        line_->turn.notify_all();
     }
 }
 
@@ -133,12 +149,13 @@ void LinuxSerialQueue::itemEnded(LinuxWorkItem& item)
     }
     finished = std::move(running_);
     running_ = nullptr;
-    if (waiting_.empty()) {
+    if (!line_ || line_->items.empty()) {
         lock.unlock();
         return;
     }
-    running_ = std::move(waiting_.front());
-    waiting_.pop_front();
+    running_ = std::move(line_->items.front());
+    line_->items.pop_front();
+    dropEmptyLine();
     ready_ = running_->root();
     if (ready_) {
         announceIfReady(lock);
@@ -154,7 +171,10 @@ void LinuxSerialQueue::close()
     closed_ = true;
     ready_ = nullptr;
     const auto running = std::exchange(running_, nullptr);
-    const auto waiting = std::exchange(waiting_, {});
+    std::list<std::shared_ptr<LinuxWorkItem>> waiting;
+    if (line_) {
+        waiting.swap(line_->items);
+    }
     wakeWaiting();
     lock.unlock();
 }
@@ -185,7 +205,7 @@ void LinuxSerialQueue::runSlices()
 void LinuxSerialQueue::announceIfReady(Lock& lock)
 {
     const bool needed = ready_ && !sliceRuns_;
-    if (needed && waitingThreads_ > 0) {
+    if (needed) {
         wakeWaiting();
     }
     lock.unlock();

@@ -29,7 +29,16 @@ protected:
 
 private:
     using Lock = std::unique_lock<std::mutex>;
+    /// What waits for its turn.
+    struct Line {
+        std::list<std::shared_ptr<LinuxWorkItem>> items;
+        /// Whose items are in the line, or were just now.
+        unsigned threads = 0;
+        std::condition_variable turn;
+    };
 
+    Line& line();
+    void dropEmptyLine();
     bool mayRunHere(const LinuxWorkItem& item, const WorkItem* awaitedBy) const;
     void waitForTurn(Lock& lock, const std::shared_ptr<LinuxWorkItem>& item);
     void runSlice(Lock& lock);
@@ -43,12 +52,9 @@ private:
 
     std::mutex mutex_;
     // All below is protected by mutex_.
-    /// Made for the first thread that waits.
-    std::unique_ptr<std::condition_variable> turn_;
-    unsigned waitingThreads_ = 0;
     std::shared_ptr<LinuxWorkItem> running_;
-    /// A list, which costs nothing while it is empty: most queues belong to idle connections.
-    std::list<std::shared_ptr<LinuxWorkItem>> waiting_;
+    /// Null while nothing waits: most queues belong to idle connections.
+    std::unique_ptr<Line> line_;
     /// Where the running item goes on, once some thread takes it.
     std::coroutine_handle<> ready_;
     /// A thread runs a slice, and looks at ready_ when it has returned.

@@ -9,9 +9,7 @@
 #include "platform/work_queues.h"
 
 #include <memory>
-#include <mutex>
 #include <string>
-#include <unordered_map>
 
 namespace typhon {
 
@@ -39,12 +37,9 @@ public:
     void close();
 
 private:
-    /// The queues that exist, for `close`.
-    struct Registry {
-        std::mutex mutex;
-        std::unordered_map<const LinuxQueue*, std::weak_ptr<LinuxQueue>> queues;
-        bool closed = false;
-    };
+    class Registry;
+    class ListedQueue;
+
     static Task<void> pauseWith(std::shared_ptr<TimerService> timers, std::chrono::nanoseconds duration);
 
     const std::shared_ptr<PoolExecutor> pool_;
@@ -54,7 +49,7 @@ private:
     const std::shared_ptr<LinuxMainQueue> mainQueue_;
     const std::shared_ptr<LinuxConcurrentQueue> default_;
     const std::shared_ptr<LinuxConcurrentQueue> background_;
-    const std::shared_ptr<Registry> registry_ = std::make_shared<Registry>();
+    const std::shared_ptr<Registry> registry_;
 };
 
 }  // namespace typhon
