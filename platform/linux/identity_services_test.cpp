@@ -78,6 +78,8 @@ struct IdentityServicesTest : ::testing::Test {
         startSandboxesService(ipc, sandboxes);
         startIdentitiesService(ipc, identities);
     }
+    // The end of a connection may still be handled.
+    ~IdentityServicesTest() override { pool.stop(); }
 
     CallResult call(const char* service, const InterfaceDescriptions& interfaces, const char* member,
                     Arguments arguments)

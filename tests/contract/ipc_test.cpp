@@ -72,6 +72,8 @@ public:
     {
         client_.reset();
         server_.reset();
+        // The end of a connection may still be handled.
+        pool_.stop();
     }
     Ipc& server() override { return *server_; }
     Ipc& client() override { return *client_; }

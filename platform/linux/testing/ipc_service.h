@@ -157,6 +157,8 @@ public:
     {
         delegate->object->release();
         ipc.reset();
+        // A connection that came or ended just now may still be handled.
+        pool.stop();
     }
     std::string path() const { return root.real("/run/typhon/") + testedService; }
 
