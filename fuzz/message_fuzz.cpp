@@ -136,6 +136,7 @@ private:
     {
         switch (reception_.next(source())) {
         case Outcome::ready:
+        case Outcome::readyAmongOthers:
             return readReady();
         case Outcome::assembled: {
             MessageDecoder decoder;

@@ -103,8 +103,9 @@ private:
 
     template <class Body>
     void locked(Body body);
-    /// What is to be done after something was read.
-    enum class Next { wait, read, decode };
+    /// What is to be done after something was read: `look` whether there is more, `read` what is known to be
+    /// there.
+    enum class Next { wait, look, read, decode };
 
     Next handleInput(std::uint32_t events, Afterwards& afterwards);
     Next processInput(Afterwards& afterwards);

@@ -56,22 +56,26 @@ void BusLink::handleEvents(std::uint32_t events)
 {
     const bool hasHungUp = (events & (EPOLLHUP | EPOLLERR)) != 0;
     // What arrives meanwhile is not announced to another thread, which could do no more than wait for this
-    // one: it is read when this one is done. Its sender did not wait for an answer, so that counts.
-    auto next = Next::read;
-    Clock::time_point begin;
+    // one: it is read when this one is done. What lay there before its predecessor was answered counts: its
+    // sender did not wait for the answer.
+    auto next = Next::look;
     std::chrono::nanoseconds taken{};
-    for (int count = 0; next == Next::read && count < messagesAtOnce && taken < turn; ++count) {
-        begin = count == 1 ? Clock::now() : begin;
+    std::chrono::nanoseconds owed{};
+    for (int count = 0; next != Next::wait && count < messagesAtOnce && taken < turn; ++count) {
+        const bool layThere = next == Next::read;
+        const auto begin = count > 0 ? Clock::now() : Clock::time_point();
         locked([&](Afterwards& later) { next = handleInput(std::exchange(events, 0), later); });
         if (next == Next::decode) {
             decode();
             next = Next::read;
         }
-        if (count > 0 && next == Next::read) {
-            taken = Clock::now() - begin;
+        if (count > 0 && next != Next::wait) {
+            const auto duration = Clock::now() - begin;
+            taken += duration;
+            owed += layThere ? duration : Clock::duration::zero();
         }
     }
-    proceedAfter(taken, hasHungUp);
+    proceedAfter(owed, hasHungUp);
 }
 
 /// Goes on reading, now or when the peer has rested enough for the time that it has taken.
@@ -148,9 +152,9 @@ BusLink::Next BusLink::processInput(Afterwards& afterwards)
     const auto& limits = context_->limits.message;
     const auto outcome = reception_.next(
         {bus_.socket(), limits.bytes, descriptorsAllowed_ ? limits.descriptors : 0, holder()});
-    if (outcome == Outcome::ready) {
+    if (outcome == Outcome::ready || outcome == Outcome::readyAmongOthers) {
         processReadyMessage(afterwards);
-        return Next::read;
+        return outcome == Outcome::ready ? Next::look : Next::read;
     }
     if (outcome == Outcome::assembled) {
         return processAssembledMessage(afterwards);

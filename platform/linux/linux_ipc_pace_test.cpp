@@ -112,6 +112,80 @@ TEST(LinuxIpcPace, WhoSendsFasterThanItIsAnsweredRestsAndLosesNothing)
     EXPECT_TRUE(service.log.waitFor("noted paced", 200));
 }
 
+/// Stays with its first call after it has answered it, until it is told to leave.
+class LingeringObject : public ExportedObject {
+public:
+    Task<void> handle(std::shared_ptr<IncomingCall> call) override
+    {
+        call->reply(call->arguments());
+        if (!std::exchange(hasLingered_, true)) {
+            left.get_future().wait();
+        }
+        co_return;
+    }
+    std::promise<void> left;
+
+private:
+    bool hasLingered_ = false;
+};
+
+class LingeringDelegate : public ListenerDelegate {
+public:
+    bool listener(Listener&, std::shared_ptr<Connection> connection) override
+    {
+        connection->setExportedInterfaces(std::make_shared<const std::vector<InterfaceDescription>>(
+            std::vector<InterfaceDescription>{{testedInterface, {{"echo", "s", "s"}}}}));
+        connection->setExportedObject(object);
+        connection->resume();
+        return true;
+    }
+    const std::shared_ptr<LingeringObject> object = std::make_shared<LingeringObject>();
+};
+
+bool hasAnswer(const ForeignClient& client)
+{
+    pollfd answered{sd_bus_get_fd(client.bus), POLLIN, 0};
+    return ::poll(&answered, 1, 20'000) == 1;
+}
+
+TEST(LinuxIpcPace, WhoWaitsForEachAnswerNeverRestsHoweverFastItGoesOn)
+{
+    auto limits = pacedLimits();
+    // A single message that counts would be more than the client can wait for.
+    limits.pace = {.allowance = 1ns, .oneIn = 1'000'000'000, .connection = 0ns, .longestRest = 1h};
+    TestedService service(limits);
+    const auto delegate = std::make_shared<LingeringDelegate>();
+    service.listener->setDelegate(delegate);
+    ForeignClient client(service.path());
+    ASSERT_TRUE(client.isAlive());
+    // The thread that answered has not come back to look, and finds this when it does.
+    auto* next = client.newCall("echo");
+    ASSERT_GE(sd_bus_message_append(next, "s", "next"), 0);
+    std::uint64_t cookie = 0;
+    ASSERT_GE(sd_bus_send(client.bus, next, &cookie), 0);
+    sd_bus_message_unref(next);
+    delegate->object->left.set_value();
+    ASSERT_TRUE(hasAnswer(client));
+    EXPECT_TRUE(client.isAlive());
+}
+
+TEST(LinuxIpcPace, WhoDoesNotWaitForItsAnswersRests)
+{
+    auto limits = pacedLimits();
+    limits.pace = {.allowance = 1ns, .oneIn = 1'000'000, .connection = 0ns, .longestRest = 200ms};
+    TestedService service(limits);
+    const std::string text = "hastily";
+    std::string burst;
+    for (int count = 0; count < 50; ++count) {
+        burst += WireMessage::call(1, testedInterface, "note", &text);
+    }
+    const auto begin = std::chrono::steady_clock::now();
+    const auto socket = rawConnection(service.path());
+    write(socket, pipelinedHandshake() + burst);
+    EXPECT_TRUE(service.log.waitFor("noted hastily", 50));
+    EXPECT_GE(std::chrono::steady_clock::now() - begin, 190ms);
+}
+
 TEST(LinuxIpcPace, APeerMayLeaveWhileItRestsWithAnswersUnread)
 {
     auto limits = pacedLimits();

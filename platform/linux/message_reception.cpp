@@ -41,7 +41,7 @@ std::uint64_t messageSize(Bytes header)
 /// Where messages are looked at. Nothing of it is used later.
 std::span<std::uint8_t> scratch()
 {
-    thread_local std::vector<std::uint8_t> bytes(largeLook);
+    thread_local std::vector<std::uint8_t> bytes(largeLook + 1);
     return bytes;
 }
 
@@ -86,12 +86,15 @@ MessageReception::Outcome look(const MessageReception::Source& source)
         return Outcome::tooLarge;
     }
     if (static_cast<std::size_t>(waiting) < size && size <= largeLook) {
-        const auto larger = peek(source.socket, size);
+        const auto larger = peek(source.socket, size + 1);
         waiting = larger.bytes;
         descriptors = larger.descriptors;
     }
     const bool isWhole = std::cmp_greater_equal(waiting, size) && !descriptors;
-    return isWhole && isPlainMessage(scratch().first(size)) ? Outcome::ready : Outcome::begun;
+    if (!isWhole || !isPlainMessage(scratch().first(size))) {
+        return Outcome::begun;
+    }
+    return std::cmp_equal(waiting, size) ? Outcome::ready : Outcome::readyAmongOthers;
 }
 
 }  // namespace

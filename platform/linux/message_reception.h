@@ -39,6 +39,8 @@ public:
         nothing,
         /// sd-bus may read: it gets exactly one message.
         ready,
+        /// The same, and something lies behind it.
+        readyAmongOthers,
         /// A message was put together: `take` it.
         assembled,
         /// A message has begun, its rest is yet to come.
