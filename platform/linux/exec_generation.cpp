@@ -69,13 +69,26 @@ std::uint64_t randomAddress(const char* vector, std::size_t length)
     return 0;
 }
 
-std::uint64_t hashOf(const unsigned char* bytes, std::size_t length)
+using HashKey = std::array<unsigned char, crypto_shorthash_KEYBYTES>;
+
+std::uint64_t hashOf(const char* bytes, std::size_t length, const HashKey& key)
 {
-    std::array<unsigned char, crypto_generichash_BYTES_MIN> digest;
-    crypto_generichash(digest.data(), digest.size(), bytes, length, nullptr, 0);
     std::uint64_t value = 0;
-    std::memcpy(&value, digest.data(), sizeof value);
+    static_assert(crypto_shorthash_BYTES == sizeof value);
+    crypto_shorthash(reinterpret_cast<unsigned char*>(&value), reinterpret_cast<const unsigned char*>(bytes),
+                     length, key.data());
     return value;
+}
+
+/// Nobody outside can look for two programs with the same value, or tell from a value what it is of.
+const HashKey& secretKey()
+{
+    static const HashKey key = [] {
+        HashKey bytes;
+        randombytes_buf(bytes.data(), bytes.size());
+        return bytes;
+    }();
+    return key;
 }
 
 }  // namespace
@@ -92,7 +105,7 @@ std::uint64_t execGeneration(pid_t processIdentifier, int processDirectory)
         !readMemory(processIdentifier, processDirectory, address, bytes.data() + length, randomLength)) {
         return 0;
     }
-    const auto value = hashOf(reinterpret_cast<const unsigned char*>(bytes.data()), length + randomLength);
+    const auto value = hashOf(bytes.data(), length + randomLength, secretKey());
     sodium_memzero(bytes.data(), bytes.size());
     return value == 0 ? 1 : value;
 }
@@ -122,8 +135,7 @@ std::uint32_t bootEpoch()
         std::array<char, 64> buffer;
         const auto length =
             readFile(AT_FDCWD, "/proc/sys/kernel/random/boot_id", buffer.data(), buffer.size());
-        const auto value =
-            static_cast<std::uint32_t>(hashOf(reinterpret_cast<const unsigned char*>(buffer.data()), length));
+        const auto value = static_cast<std::uint32_t>(hashOf(buffer.data(), length, {}));
         return value == 0 ? 1u : value;
     }();
     return epoch;

@@ -7,8 +7,9 @@
 
 namespace typhon {
 
-/// A value that changes with every exec of a process; 0 when it cannot be told. `processIdentifier` is that
-/// of the process whose directory in /proc it is: somebody makes sure afterwards that it still is.
+/// A value that changes with every exec of a process, and means nothing outside of the calling process; 0
+/// when it cannot be told. `processIdentifier` is that of the process whose directory in /proc it is:
+/// somebody makes sure afterwards that it still is.
 std::uint64_t execGeneration(pid_t processIdentifier, int processDirectory);
 
 /// The start time in clock ticks since boot, or null.

@@ -28,7 +28,7 @@ void answer(FileAccessBroker* broker, IncomingCall& call)
         return;
     }
     const auto& bytes = token->asData()->bytes;
-    const std::string text(bytes.begin(), bytes.end());
+    const std::string_view text(reinterpret_cast<const char*>(bytes.data()), bytes.size());
     auto opening = broker->open(currentAuditToken(), text, *path->asString());
     if (!opening.file) {
         call.fail(std::move(opening.error));
