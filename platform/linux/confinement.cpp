@@ -1,17 +1,13 @@
 #include "platform/linux/confinement.h"
 
+#include "platform/linux/mount_identifier.h"
+
 #include <charconv>
 #include <string>
 #include <string_view>
 
 #include <fcntl.h>
-#include <linux/stat.h>
-#include <sys/stat.h>
 #include <unistd.h>
-
-#ifndef STATX_MNT_ID_UNIQUE
-#define STATX_MNT_ID_UNIQUE 0x00004000U
-#endif
 
 // What can be seen of a sandbox from outside: namespaces, root, seccomp filter, LSM label. A Landlock domain
 // cannot be seen. Files that sandboxes describe themselves with (".flatpak-info") prove nothing, since
@@ -22,11 +18,11 @@ namespace typhon {
 namespace {
 
 /// Under `--ro-bind / /` the root is the same directory on another mount, so the mount counts.
-std::optional<std::array<std::uint64_t, 3>> identityOf(const FileDescriptor& root)
+std::optional<std::array<std::uint64_t, 3>> rootSeenFrom(int processDirectory)
 {
     struct statx status;
     for (const unsigned mountId : {STATX_MNT_ID_UNIQUE, static_cast<unsigned>(STATX_MNT_ID)}) {
-        if (!root || ::statx(root.get(), "", AT_EMPTY_PATH, STATX_INO | mountId, &status) != 0) {
+        if (::statx(processDirectory, "root", 0, STATX_INO | mountId, &status) != 0) {
             return std::nullopt;
         }
         if ((status.stx_mask & mountId) != 0) {
@@ -77,26 +73,25 @@ std::string_view statusLine(std::string_view status, std::string_view name)
 
 }  // namespace
 
-ConfinementProbe::View ConfinementProbe::viewOf(int directory, const FileDescriptor& root)
+ConfinementProbe::View ConfinementProbe::viewOf(int directory)
 {
     return {namespaceOf(directory, "ns/mnt"), namespaceOf(directory, "ns/user"),
-            namespaceOf(directory, "ns/pid"), identityOf(root)};
+            namespaceOf(directory, "ns/pid"), rootSeenFrom(directory)};
 }
 
 ConfinementProbe::ConfinementProbe()
 {
     const FileDescriptor one(::open("/proc/1", O_PATH | O_DIRECTORY | O_CLOEXEC));
     const FileDescriptor self(::open("/proc/self", O_PATH | O_DIRECTORY | O_CLOEXEC));
-    const auto viewOfWhole = [](const FileDescriptor& process) {
-        const FileDescriptor root(::openat(process.get(), "root", O_PATH | O_DIRECTORY | O_CLOEXEC));
-        return viewOf(process.get(), root);
-    };
-    host_ = viewOfWhole(one);
+    host_ = viewOf(one.get());
     const bool isProcessOne = host_.isWhole();
     if (!isProcessOne) {
-        host_ = viewOfWhole(self);
+        host_ = viewOf(self.get());
     }
-    hostProcessNamespace_ = inodeAt(isProcessOne ? one.get() : self.get(), "ns/pid");
+    const auto& host = isProcessOne ? one : self;
+    hostProcessNamespace_ = inodeAt(host.get(), "ns/pid");
+    hostRoot_ = std::make_shared<const FileDescriptor>(
+        ::openat(host.get(), "root", O_PATH | O_DIRECTORY | O_CLOEXEC));
     // Without a labelling LSM the file exists and reading it fails.
     const FileDescriptor label(::openat(self.get(), "attr/current", O_RDONLY | O_CLOEXEC));
     char first = 0;
@@ -128,16 +123,22 @@ Confinement ConfinementProbe::look(const ProcessInspection& process) const
 
 Confinement ConfinementProbe::examine(const ProcessInspection& process) const
 {
-    const auto view = viewOf(process.directory(), *process.root());
+    const auto view = viewOf(process.directory());
     if (!host_.isWhole() || !view.isWhole()) {
         return {};
     }
     Confinement seen;
     seen.hasOwnProcessNamespace = view.process != host_.process;
     seen.hasOwnUserNamespace = view.user != host_.user;
+    seen.hasOwnRoot = view.root != host_.root;
     seen.isSandboxed = seen.hasOwnProcessNamespace || seen.hasOwnUserNamespace || view.mount != host_.mount ||
-                       view.root != host_.root || isRestricted(process);
+                       seen.hasOwnRoot || isRestricted(process);
     return seen;
+}
+
+std::shared_ptr<const FileDescriptor> ConfinementProbe::rootOf(const ProcessInspection& process) const
+{
+    return look(process).hasOwnRoot ? process.root() : hostRoot_;
 }
 
 }  // namespace typhon

@@ -22,6 +22,10 @@ public:
     /// afterwards that it still is the same process.
     Confinement look(const ProcessInspection& process) const;
 
+    /// The root directory of the process, as an `O_PATH` descriptor; none if that cannot be opened. The
+    /// host's, which is held open, where the process has none of its own.
+    std::shared_ptr<const FileDescriptor> rootOf(const ProcessInspection& process) const;
+
     /// The process namespace of the host.
     const std::optional<Inode>& hostProcessNamespace() const { return hostProcessNamespace_; }
 
@@ -36,13 +40,14 @@ private:
         std::optional<std::array<std::uint64_t, 3>> root;
         bool isWhole() const { return mount && user && process && root; }
     };
-    static View viewOf(int processDirectory, const FileDescriptor& root);
+    static View viewOf(int processDirectory);
     bool isRestricted(const ProcessInspection& process) const;
 
     Confinement examine(const ProcessInspection& process) const;
 
     View host_;
     std::optional<Inode> hostProcessNamespace_;
+    std::shared_ptr<const FileDescriptor> hostRoot_;
     bool hasLabels_ = false;
 };
 

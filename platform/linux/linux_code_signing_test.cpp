@@ -1,4 +1,5 @@
 #include "platform/linux/linux_code_signing.h"
+#include "platform/linux/mount_identifier.h"
 #include "testing/child_process.h"
 #include "testing/forged_executable.h"
 #include "testing/scratch_folder.h"
@@ -117,6 +118,48 @@ TEST_F(LinuxCodeSigningTest, AChangedProgramIsNobody)
     sign(program, "org.example.viewer", key);
     ASSERT_EQ(identifierOf(program), "org.example.viewer");
     std::ofstream(program, std::ios::binary | std::ios::app) << "changed";
+    EXPECT_EQ(identifierOf(program), "");
+}
+
+TEST_F(LinuxCodeSigningTest, AProgramIsReadOnce)
+{
+    trust(key);
+    sign(program, "org.example.viewer", key);
+    const FileDescriptor directory(::open(folder.path.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    std::filesystem::create_symlink(program, folder.path + "/exe");
+    struct statx status;
+    ASSERT_EQ(::statx(AT_FDCWD, program.c_str(), 0, STATX_MNT_ID_UNIQUE, &status), 0);
+    // Older kernels give the numbers of mounts to others again: there it is opened each time.
+    const bool isKnownUnopened = (status.stx_mask & STATX_MNT_ID_UNIQUE) != 0;
+    SignatureStore::Executable seen;
+    // A file that was changed just now might change again without a trace.
+    for (int times = 0; times < 10'000 && !seen.digest; ++times) {
+        seen = signatures.executableOf(directory.get());
+        ASSERT_EQ(signatures.digestOf(seen), testing::digestOf(program));
+    }
+    EXPECT_EQ(seen.digest.has_value(), isKnownUnopened);
+    std::ofstream(program, std::ios::binary | std::ios::app) << "changed";
+    const auto changed = signatures.executableOf(directory.get());
+    EXPECT_FALSE(changed.digest);
+    EXPECT_EQ(signatures.digestOf(changed), testing::digestOf(program));
+}
+
+TEST_F(LinuxCodeSigningTest, AProcessKeepsTheProgramItWasStartedFrom)
+{
+    trust(key);
+    sign(program, "org.example.viewer", key);
+    ChildProcess child({program});
+    child.waitForEcho();
+    for (int message = 0; message < 3; ++message) {
+        const MessageLooks looks;
+        ASSERT_EQ(identifierOf(child.token()), "org.example.viewer");
+    }
+    const auto other = folder.program("other");
+    std::ofstream(other, std::ios::binary | std::ios::app) << "changed";
+    std::filesystem::rename(other, program);
+    // The process runs the file that it was started from, which has no name any more.
+    const MessageLooks looks;
+    EXPECT_EQ(identifierOf(child.token()), "org.example.viewer");
     EXPECT_EQ(identifierOf(program), "");
 }
 

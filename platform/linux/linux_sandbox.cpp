@@ -16,7 +16,7 @@ bool LinuxSandbox::isSandboxed(const AuditToken& token)
 std::optional<bool> LinuxSandbox::reaches(const ProcessInspection& process, const std::string& path)
 {
     const auto ours = inodeAt(AT_FDCWD, root_.real(path).c_str());
-    const auto root = process.root();
+    const auto root = probe_.rootOf(process);
     const auto credentials = fileCredentialsOf(process, probe_.look(process).hasOwnUserNamespace);
     if (!ours || !*root || !credentials) {
         return std::nullopt;

@@ -8,6 +8,7 @@
 
 #include <grp.h>
 #include <gtest/gtest.h>
+#include <sched.h>
 
 namespace typhon {
 namespace {
@@ -95,6 +96,31 @@ TEST_F(LinuxSandboxTest, AnotherFileAtTheSamePathIsNotTheFile)
     ChildProcess child(inSandbox({"--ro-bind", other, real}));
     child.waitForEcho();
     EXPECT_FALSE(sandbox.mayRead(child.tokenInside(), font));
+}
+
+TEST_F(LinuxSandboxTest, AProcessIsAskedInTheRootThatItHasAtEachMessage)
+{
+    folder.write(font, "font");
+    ChildProcess child([](int stream) {
+        char byte = 'r';
+        [[maybe_unused]] auto length = ::write(stream, &byte, 1);
+        length = ::read(stream, &byte, 1);
+        if ((::geteuid() == 0 || ::unshare(CLONE_NEWUSER) == 0) && ::chroot("/usr") == 0) {
+            testing::remain(stream);
+        }
+    });
+    ASSERT_EQ(child.read(), "r");
+    const auto token = child.token();
+    {
+        const MessageLooks message;
+        EXPECT_FALSE(sandbox.isSandboxed(token));
+        EXPECT_TRUE(sandbox.mayRead(token, font));
+    }
+    child.write("x");
+    ASSERT_EQ(child.read(), "r");
+    const MessageLooks message;
+    EXPECT_TRUE(sandbox.isSandboxed(token));
+    EXPECT_FALSE(sandbox.mayRead(token, font));
 }
 
 TEST_F(LinuxSandboxTest, TheFileItselfAtTheLogicalPathIsFound)

@@ -17,6 +17,8 @@ struct Confinement {
     bool hasOwnProcessNamespace = true;
     /// It lives in another user namespace than the host's, or that cannot be told.
     bool hasOwnUserNamespace = true;
+    /// It has another root directory than the host, or the same on another mount, or that cannot be told.
+    bool hasOwnRoot = true;
 };
 
 /// What was seen of a process.

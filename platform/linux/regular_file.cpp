@@ -7,6 +7,7 @@
 
 #include <linux/openat2.h>
 #include <sys/syscall.h>
+#include <sys/sysmacros.h>
 
 namespace typhon {
 
@@ -37,6 +38,13 @@ FileIdentity::FileIdentity(const struct stat& status)
     : device(status.st_dev), inode(status.st_ino), changeSeconds(status.st_ctim.tv_sec),
       changeNanoseconds(status.st_ctim.tv_nsec), modificationSeconds(status.st_mtim.tv_sec),
       modificationNanoseconds(status.st_mtim.tv_nsec), size(status.st_size)
+{}
+
+FileIdentity::FileIdentity(const struct statx& status)
+    : device(makedev(status.stx_dev_major, status.stx_dev_minor)), inode(status.stx_ino),
+      changeSeconds(status.stx_ctime.tv_sec), changeNanoseconds(status.stx_ctime.tv_nsec),
+      modificationSeconds(status.stx_mtime.tv_sec), modificationNanoseconds(status.stx_mtime.tv_nsec),
+      size(static_cast<std::int64_t>(status.stx_size))
 {}
 
 bool FileIdentity::isSettled() const

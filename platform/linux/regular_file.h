@@ -27,6 +27,7 @@ struct FileIdentity {
 
     FileIdentity() = default;
     explicit FileIdentity(const struct stat& status);
+    explicit FileIdentity(const struct statx& status);
     // NOLINTNEXTLINE(modernize-use-nullptr): it misreads the comparison
     auto operator<=>(const FileIdentity&) const = default;
 

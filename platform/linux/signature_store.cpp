@@ -1,16 +1,17 @@
 #include "platform/linux/signature_store.h"
 
 #include "platform/linux/code_signature.h"
+#include "platform/linux/mount_identifier.h"
 #include "platform/linux/trusted_directory.h"
 
-#include <sys/stat.h>
+#include <fcntl.h>
 #include <sys/vfs.h>
 
 namespace typhon {
 
 namespace {
 
-constexpr std::int64_t executableLimit = std::int64_t{1} << 30;
+constexpr std::uint64_t executableLimit = std::uint64_t{1} << 30;
 /// A file system in user space answers whenever and whatever its owner likes.
 constexpr long fuse = 0x65735546;
 
@@ -82,29 +83,64 @@ CodeSigningTask SignatureStore::taskOfExecutable(const Sha256& executable)
     return task;
 }
 
+std::optional<SignatureStore::FileOnMount> SignatureStore::executableAt(int directory, const char* name)
+{
+    struct statx status;
+    const int flags = *name == '\0' ? AT_EMPTY_PATH : 0;
+    if (::statx(directory, name, flags, STATX_BASIC_STATS | STATX_MNT_ID_UNIQUE, &status) != 0 ||
+        !S_ISREG(status.stx_mode) || status.stx_size > executableLimit) {
+        return std::nullopt;
+    }
+    const bool hasMount = (status.stx_mask & STATX_MNT_ID_UNIQUE) != 0;
+    return FileOnMount{FileIdentity(status), hasMount ? status.stx_mnt_id : 0};
+}
+
+std::optional<Sha256> SignatureStore::knownDigest(const FileOnMount& executable)
+{
+    const std::lock_guard lock(mutex_);
+    return digests_.find(executable);
+}
+
+SignatureStore::Executable SignatureStore::executableOf(int processDirectory)
+{
+    // Without opening it, which takes longer than all the rest. A mount that has a known file is none of
+    // those that the digest of a file is never kept of.
+    const auto seen = executableAt(processDirectory, "exe");
+    auto known = seen && seen->mount != 0 ? knownDigest(*seen) : std::nullopt;
+    if (known) {
+        return {known, {}};
+    }
+    return {std::nullopt,
+            FileDescriptor(::openat(processDirectory, "exe", O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY))};
+}
+
+std::optional<Sha256> SignatureStore::digestOf(const Executable& executable)
+{
+    return executable.digest || !executable.file ? executable.digest
+                                                 : digestOfExecutable(executable.file.get());
+}
+
 std::optional<Sha256> SignatureStore::digestOfExecutable(int descriptor)
 {
     struct statfs fileSystem;
-    struct stat status;
-    if (::fstatfs(descriptor, &fileSystem) != 0 || fileSystem.f_type == fuse ||
-        ::fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode) || status.st_size > executableLimit) {
+    if (::fstatfs(descriptor, &fileSystem) != 0 || fileSystem.f_type == fuse) {
         return std::nullopt;
     }
-    const FileIdentity file(status);
-    const bool isSettled = file.isSettled();
-    {
-        const std::lock_guard lock(mutex_);
-        if (const auto digest = digests_.find(file)) {
-            return digest;
-        }
+    const auto seen = executableAt(descriptor, "");
+    if (!seen) {
+        return std::nullopt;
+    }
+    const bool isSettled = seen->file.isSettled();
+    if (const auto known = knownDigest(*seen)) {
+        return known;
     }
     const auto digest = sha256OfFile(descriptor);
-    if (!digest || ::fstat(descriptor, &status) != 0 || FileIdentity(status) != file) {
+    if (!digest || executableAt(descriptor, "") != seen) {
         return std::nullopt;
     }
     if (isSettled) {
         const std::lock_guard lock(mutex_);
-        digests_.store(file, *digest);
+        digests_.store(*seen, *digest);
     }
     return digest;
 }

@@ -28,7 +28,27 @@ public:
     /// but a readable regular file of reasonable size on a file system that the kernel itself serves.
     std::optional<Sha256> digestOfExecutable(int descriptor);
 
+    /// A file by the name it was found under: its digest if that is known, otherwise itself, to be read.
+    struct Executable {
+        std::optional<Sha256> digest;
+        FileDescriptor file;
+    };
+    /// What the process whose directory in /proc it is runs. Reads nothing of it yet.
+    Executable executableOf(int processDirectory);
+    /// Null as above.
+    std::optional<Sha256> digestOf(const Executable& executable);
+
 private:
+    /// A state of a file on one mount, which is for good a mount of one file system.
+    struct FileOnMount {
+        FileIdentity file;
+        /// Zero when the kernel does not tell.
+        std::uint64_t mount = 0;
+        // NOLINTNEXTLINE(modernize-use-nullptr): it misreads the comparison
+        auto operator<=>(const FileOnMount&) const = default;
+    };
+    static std::optional<FileOnMount> executableAt(int directory, const char* name);
+    std::optional<Sha256> knownDigest(const FileOnMount& executable);
     struct Known {
         FileIdentity file;
         TrustedKeys::Snapshot keys;
@@ -41,7 +61,7 @@ private:
     TrustedKeys keys_;
     std::mutex mutex_;
     BoundedCache<Sha256, Known> known_{4096};
-    BoundedCache<FileIdentity, Sha256> digests_{4096};
+    BoundedCache<FileOnMount, Sha256> digests_{4096};
 };
 
 }  // namespace typhon
