@@ -92,13 +92,18 @@ TEST(Confinement, SeesAnotherRootDirectory)
     EXPECT_TRUE(lookAt(child).isSandboxed);
 }
 
+bool takeOnSystemCallFilter()
+{
+    sock_filter allow[] = {{BPF_RET | BPF_K, 0, 0, SECCOMP_RET_ALLOW}};
+    const sock_fprog program{1, allow};
+    return ::prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0 &&
+           ::prctl(PR_SET_SECCOMP, SECCOMP_MODE_FILTER, &program) == 0;
+}
+
 TEST(Confinement, SeesASystemCallFilter)
 {
     ChildProcess child([](int stream) {
-        sock_filter allow[] = {{BPF_RET | BPF_K, 0, 0, SECCOMP_RET_ALLOW}};
-        const sock_fprog program{1, allow};
-        if (::prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0 &&
-            ::prctl(PR_SET_SECCOMP, SECCOMP_MODE_FILTER, &program) == 0) {
+        if (takeOnSystemCallFilter()) {
             testing::remain(stream);
         }
     });
@@ -108,13 +113,14 @@ TEST(Confinement, SeesASystemCallFilter)
     EXPECT_FALSE(seen.hasOwnUserNamespace);
 }
 
-TEST(Confinement, IsSeenFromTheMomentAProcessTakesItOn)
+/// Takes it on when told to, in the midst of its life.
+void expectToBeSeenOnceTakenOn(bool (*takeOn)())
 {
-    ChildProcess child([](int stream) {
+    ChildProcess child([takeOn](int stream) {
         char byte = 'r';
         [[maybe_unused]] auto length = ::write(stream, &byte, 1);
         length = ::read(stream, &byte, 1);
-        if (::unshare(CLONE_NEWUSER) == 0) {
+        if (takeOn()) {
             testing::remain(stream);
         }
     });
@@ -123,6 +129,16 @@ TEST(Confinement, IsSeenFromTheMomentAProcessTakesItOn)
     child.write("x");
     ASSERT_EQ(child.read(), "r");
     EXPECT_TRUE(lookAt(child).isSandboxed);
+}
+
+TEST(Confinement, IsSeenFromTheMomentAProcessEntersANamespace)
+{
+    expectToBeSeenOnceTakenOn([] { return ::unshare(CLONE_NEWUSER) == 0; });
+}
+
+TEST(Confinement, IsSeenFromTheMomentAProcessTakesOnASystemCallFilter)
+{
+    expectToBeSeenOnceTakenOn(takeOnSystemCallFilter);
 }
 
 }  // namespace
