@@ -36,7 +36,8 @@ std::optional<std::string> makeDirectories(const std::string& path, mode_t permi
 /// Makes `path` a file with these contents and permissions in one step that a crash or power cut cannot
 /// split: written beside it as `path` + ".new", flushed, renamed, and the directory flushed. Callers exclude
 /// each other with a lock; what a crashed one left behind is replaced. When root writes into a directory of
-/// another user, the file becomes that user's.
+/// another user, the file becomes that user's. Its modification time is one that no later change of the
+/// contents can have.
 std::optional<std::string> replaceFile(const std::string& path, std::span<const std::uint8_t> contents,
                                        mode_t permissions);
 

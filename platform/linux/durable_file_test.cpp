@@ -1,4 +1,6 @@
 #include "platform/linux/durable_file.h"
+#include "platform/linux/file_descriptor.h"
+#include "platform/linux/regular_file.h"
 #include "platform/linux/scratch_directory.h"
 
 #include <chrono>
@@ -8,6 +10,7 @@
 #include <string_view>
 #include <vector>
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -65,6 +68,27 @@ TEST(ReplaceFile, DoesNotWriteThroughALinkInPlaceOfTheNewFile)
     EXPECT_EQ(replaceFile(scratch.real("/file"), bytes("new"), 0600), std::nullopt);
     EXPECT_EQ(scratch.readFile("/victim"), "untouched");
     EXPECT_EQ(scratch.readFile("/file"), "new");
+}
+
+FileIdentity identityOf(const std::string& path)
+{
+    struct stat status {};
+    EXPECT_EQ(::stat(path.c_str(), &status), 0);
+    return FileIdentity(status);
+}
+
+TEST(ReplaceFile, GivesATimeThatNoLaterChangeHas)
+{
+    const ScratchDirectory scratch;
+    const auto path = scratch.real("/file");
+    for (int round = 0; round < 200; ++round) {
+        ASSERT_EQ(replaceFile(path, bytes("before"), 0600), std::nullopt);
+        const auto before = identityOf(path);
+        EXPECT_TRUE(before.hasSettledContents());
+        const FileDescriptor file(::open(path.c_str(), O_WRONLY | O_CLOEXEC));
+        ASSERT_EQ(::pwrite(file.get(), "after!", 6, 0), 6);
+        EXPECT_FALSE(identityOf(path).hasContentsOf(before));
+    }
 }
 
 TEST(ReplaceFile, LeavesTheOldFileAndSaysWhyWhenItFails)
