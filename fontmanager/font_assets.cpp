@@ -6,6 +6,7 @@
 #include "platform/font_directories.h"
 #include "platform/linux/directory_listing.h"
 #include "platform/linux/durable_file.h"
+#include "platform/linux/file_descriptor.h"
 #include "platform/linux/regular_file.h"
 #include "platform/linux/visible_text.h"
 
@@ -13,6 +14,7 @@
 
 #include <fcntl.h>
 #include <linux/openat2.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace typhon {
@@ -30,6 +32,30 @@ const std::string fontAssets(font_directories::fontAssets);
 bool isAssetName(const std::string& name)
 {
     return !name.empty() && name.front() != '.' && name == visibleText(name);
+}
+
+struct MadeDirectory {
+    FileDescriptor directory;
+    /// Why there is none.
+    std::string error;
+};
+
+/// Opens `name`, the directory `path`, in an open directory. Made when it is missing.
+MadeDirectory openMadeDirectory(const std::string& path, int in, const std::string& name)
+{
+    FileDescriptor directory(::openat(in, name.c_str(), directoryFlags));
+    if (!directory && errno == ENOENT) {
+        if (auto error = makeDirectories(path, directoryPermissions)) {
+            return {{}, std::move(*error)};
+        }
+        directory = FileDescriptor(::openat(in, name.c_str(), directoryFlags));
+    }
+    return directory ? MadeDirectory{std::move(directory), {}} : MadeDirectory{{}, errorText(errno)};
+}
+
+MadeDirectory openMadeDirectory(const std::string& path)
+{
+    return openMadeDirectory(path, AT_FDCWD, path);
 }
 
 /// To one that failed or is not whole.
@@ -50,6 +76,14 @@ void addLater(RegistryChange& change, const RegistryChange& later)
     move(change.available, change.gone, later.available);
     move(change.gone, change.available, later.gone);
     change.isRegistryChanged |= later.isRegistryChanged;
+}
+
+/// True when the file of that name in `data` has been placed in `directory` as it is now.
+bool isInPlace(int data, int directory, const std::string& name)
+{
+    struct stat status {};
+    return ::fstatat(data, name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISREG(status.st_mode) &&
+           isPlacedAssetFile(status, directory, name);
 }
 
 bool isDisabled(const PropertyList::Dictionary& entries, const std::string& path)
@@ -86,15 +120,17 @@ bool FontAssets::synchronizeOnce(RegistryChangeOutcome& outcome)
         outcome.error = "cannot list the asset store: " + objectionTo(listing);
         return false;
     }
-    if (auto error = makeDirectories(root_.real(fontAssets), directoryPermissions)) {
-        outcome.error = std::move(error);
+    const auto placed = openMadeDirectory(root_.real(fontAssets));
+    if (!placed.directory) {
+        outcome.error = placed.error;
         return false;
     }
     const auto before = readFontRecord(root_, font_paths::registry);
     Plan plan;
     for (const auto& asset : listing.directories) {
-        auto error =
-            isAssetName(asset) ? planAsset(store.get(), asset, *before.asDictionary(), plan) : std::nullopt;
+        auto error = isAssetName(asset) ? planAsset({store.get(), placed.directory.get()}, asset,
+                                                    *before.asDictionary(), plan)
+                                        : std::nullopt;
         if (error) {
             keepAsItIs(asset, *before.asDictionary(), plan);
             outcome.error = outcome.error.value_or(asset + ": " + *error);
@@ -105,28 +141,25 @@ bool FontAssets::synchronizeOnce(RegistryChangeOutcome& outcome)
         outcome.error = std::move(error);
         return false;
     }
-    removeUnwanted(plan.wanted);
+    removeUnwanted(placed.directory.get(), plan.wanted);
     addLater(outcome.change, change);
     struct stat status {};
     return !outcome.error && ::fstat(store.get(), &status) == 0 && FileIdentity(status) != listing.identity;
 }
 
 /// An error is the disk's, and leaves the rest of this asset as it is.
-std::optional<std::string> FontAssets::planAsset(int store, const std::string& asset,
+std::optional<std::string> FontAssets::planAsset(Directories directories, const std::string& asset,
                                                  const PropertyList::Dictionary& before, Plan& plan)
 {
-    const FileDescriptor data(::openat(store, (asset + "/AssetData").c_str(), directoryFlags));
+    const FileDescriptor data(::openat(directories.store, (asset + "/AssetData").c_str(), directoryFlags));
     if (!data) {
         const bool isNoAsset = errno == ENOENT || errno == ENOTDIR || errno == ELOOP;
         return isNoAsset ? std::nullopt : std::optional(errorText(errno));
     }
     const auto place = fontAssets + asset;
-    if (auto error = makeDirectories(root_.real(place), directoryPermissions)) {
-        return error;
-    }
-    const FileDescriptor directory(::open(root_.real(place).c_str(), directoryFlags));
+    const auto [directory, problem] = openMadeDirectory(root_.real(place), directories.placed, asset);
     if (!directory) {
-        return errorText(errno);
+        return problem;
     }
     const auto listing = listDirectory(data.get(), mostFiles);
     if (listing.error != 0 || listing.isCut) {
@@ -138,14 +171,13 @@ std::optional<std::string> FontAssets::planAsset(int store, const std::string& a
         if (font_paths::objectionToFontFileName(name)) {
             continue;
         }
-        const auto opened =
-            openRegularFile(name, data.get(), RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS | RESOLVE_NO_MAGICLINKS);
-        if (opened.error == 0 && before.contains(path) &&
-            isPlacedAssetFile(opened.status, directory.get(), name)) {
+        if (before.contains(path) && isInPlace(data.get(), directory.get(), name)) {
             plan.kept.insert(path);
             plan.wanted[asset].insert(name);
             continue;
         }
+        const auto opened =
+            openRegularFile(name, data.get(), RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS | RESOLVE_NO_MAGICLINKS);
         auto names = opened.error == 0 ? readNames_(opened.file.get())
                                        : FontNamesReading{.familyNames = {}, .error = opened.errorText()};
         if (!names.familyNames) {
@@ -201,14 +233,10 @@ std::optional<std::string> FontAssets::register_(const Plan& plan, RegistryChang
     });
 }
 
-void FontAssets::removeUnwanted(const Files& wanted)
+void FontAssets::removeUnwanted(int placed, const Files& wanted)
 {
-    const FileDescriptor all(::open(root_.real(fontAssets).c_str(), directoryFlags));
-    if (!all) {
-        return;
-    }
-    for (const auto& asset : listDirectory(all.get(), mostAssets).directories) {
-        const FileDescriptor directory(::openat(all.get(), asset.c_str(), directoryFlags));
+    for (const auto& asset : listDirectory(placed, mostAssets).directories) {
+        const FileDescriptor directory(::openat(placed, asset.c_str(), directoryFlags));
         const auto found = wanted.find(asset);
         for (const auto& name : listDirectory(directory.get(), mostFiles).files) {
             if (found == wanted.end() || !found->second.contains(name)) {
@@ -217,7 +245,7 @@ void FontAssets::removeUnwanted(const Files& wanted)
         }
         if (found == wanted.end()) {
             // Stays where something else is in it.
-            ::unlinkat(all.get(), asset.c_str(), AT_REMOVEDIR);
+            ::unlinkat(placed, asset.c_str(), AT_REMOVEDIR);
         }
     }
 }

@@ -41,11 +41,17 @@ private:
     };
 
     bool synchronizeOnce(RegistryChangeOutcome& outcome);
-    std::optional<std::string> planAsset(int store, const std::string& asset,
+    /// Both open.
+    struct Directories {
+        int store;
+        /// Of the directories of font files that are registered.
+        int placed;
+    };
+    std::optional<std::string> planAsset(Directories directories, const std::string& asset,
                                          const PropertyList::Dictionary& before, Plan& plan);
     static void keepAsItIs(const std::string& asset, const PropertyList::Dictionary& before, Plan& plan);
     std::optional<std::string> register_(const Plan& plan, RegistryChange& change);
-    void removeUnwanted(const Files& wanted);
+    static void removeUnwanted(int placed, const Files& wanted);
 
     const RootDirectory root_;
     const ReadFontNames readNames_;
