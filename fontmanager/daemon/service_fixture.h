@@ -113,6 +113,7 @@ public:
           ipc(pool, queues, log, root, instanceOfPeer, IpcLimits{}, EndpointHandshake::client)
     {
         openError = store.open().error;
+        store.changeWasReported();
         service =
             std::make_shared<FontRegistryService>(FontRegistryService::Parts{.store = store,
                                                                              .profileFonts = profileFonts,
