@@ -1,35 +1,20 @@
 #include "platform/linux/directory_listing.h"
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
-#include <memory>
 #include <string_view>
 
 #include <dirent.h>
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace typhon {
 
 namespace {
 
-struct DirectoryCloser {
-    void operator()(DIR* directory) const { ::closedir(directory); }
-};
-using OpenDirectory = std::unique_ptr<DIR, DirectoryCloser>;
-
-/// With an offset of its own, so that the descriptor can be listed again.
-OpenDirectory reopened(int directory)
-{
-    const int another = ::openat(directory, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    DIR* const stream = another < 0 ? nullptr : ::fdopendir(another);
-    if (another >= 0 && stream == nullptr) {
-        ::close(another);
-    }
-    return OpenDirectory(stream);
-}
-
-bool isDirectory(int directory, const dirent& entry)
+bool isDirectory(int directory, const dirent64& entry)
 {
     if (entry.d_type != DT_UNKNOWN) {
         return entry.d_type == DT_DIR;
@@ -38,21 +23,36 @@ bool isDirectory(int directory, const dirent& entry)
     return ::fstatat(directory, entry.d_name, &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISDIR(status.st_mode);
 }
 
-void readNames(DIR* stream, int directory, std::size_t limit, DirectoryListing& listing)
+/// False when there is no room for it.
+bool add(int directory, const dirent64& entry, std::size_t limit, DirectoryListing& listing)
 {
-    errno = 0;
-    while (const auto* entry = ::readdir(stream)) {
-        const std::string_view name = entry->d_name;
-        if (name != "." && name != "..") {
-            if (listing.files.size() + listing.directories.size() == limit) {
-                listing.isCut = true;
+    const std::string_view name = entry.d_name;
+    if (name == "." || name == "..") {
+        return true;
+    }
+    if (listing.files.size() + listing.directories.size() == limit) {
+        listing.isCut = true;
+        return false;
+    }
+    (isDirectory(directory, entry) ? listing.directories : listing.files).emplace_back(name);
+    return true;
+}
+
+void readNames(int directory, std::size_t limit, DirectoryListing& listing)
+{
+    constexpr std::size_t blockSize = 32U << 10;
+    alignas(dirent64) std::array<char, blockSize> block;
+    auto length = ::lseek(directory, 0, SEEK_SET) < 0 ? -1 : ::getdents64(directory, block.data(), blockSize);
+    for (; length > 0; length = ::getdents64(directory, block.data(), blockSize)) {
+        for (ssize_t at = 0; at < length;) {
+            const auto& entry = *reinterpret_cast<const dirent64*>(block.data() + at);
+            if (!add(directory, entry, limit, listing)) {
                 return;
             }
-            (isDirectory(directory, *entry) ? listing.directories : listing.files).emplace_back(name);
+            at += entry.d_reclen;
         }
-        errno = 0;
     }
-    listing.error = errno;
+    listing.error = length < 0 ? errno : 0;
 }
 
 }  // namespace
@@ -61,14 +61,13 @@ DirectoryListing listDirectory(int directory, std::size_t limit)
 {
     DirectoryListing listing;
     struct stat status {};
-    const auto stream = reopened(directory);
-    if (!stream || ::fstat(directory, &status) != 0) {
+    if (::fstat(directory, &status) != 0) {
         listing.error = errno;
         return listing;
     }
     listing.identity = FileIdentity(status);
     listing.isSettled = listing.identity.isSettled();
-    readNames(stream.get(), directory, limit, listing);
+    readNames(directory, limit, listing);
     std::ranges::sort(listing.files);
     std::ranges::sort(listing.directories);
     return listing;

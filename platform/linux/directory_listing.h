@@ -22,7 +22,8 @@ struct DirectoryListing {
     int error = 0;
 };
 
-/// Lists an open directory from its beginning; the descriptor stays the caller's.
+/// Lists an open directory from its beginning; the descriptor stays the caller's, who reads nothing else from
+/// it meanwhile.
 DirectoryListing listDirectory(int directory, std::size_t limit);
 
 }  // namespace typhon
