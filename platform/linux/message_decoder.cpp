@@ -144,6 +144,7 @@ bool MessageDecoder::sendSome(std::span<const std::uint8_t>& bytes,
                               const std::vector<FileDescriptor>& descriptors)
 {
     std::vector<int> passed;
+    passed.reserve(descriptors.size());
     for (const auto& descriptor : descriptors) {
         passed.push_back(descriptor.get());
     }
