@@ -102,12 +102,23 @@ class Gate(unittest.TestCase):
         """How many requests passed the gate."""
         return len(self.daemon.lines_with("requestFonts -  ("))
 
+    def is_at_rest(self):
+        """Whether no thread of the daemon runs or is about to."""
+        threads = pathlib.Path(f"/proc/{self.daemon.process.pid}/task")
+        try:
+            states = [thread.joinpath("stat").read_text().rpartition(")")[2].split()[0] for thread in threads.iterdir()]
+        except (FileNotFoundError, ProcessLookupError):
+            return False
+        return set(states) == {"S"}
+
     def arrive(self, process, number):
-        """Lets the next application ask, and waits until it is at the gate; gives how many had to wait."""
+        """Lets the next application ask, and waits until it has its place at the gate; gives how many had to wait."""
         before = self.waiting()
         passed = f'requestFonts -  ({{ LFFontFamilyNameAttribute = "{family_of(number)}"; '
         process.ask(1)
         eventually(lambda: self.waiting() > before or self.daemon.lines_with(passed))
+        # That line is written before the place is taken.
+        eventually(self.is_at_rest)
         return self.waiting() - before
 
     def check_in(self):
