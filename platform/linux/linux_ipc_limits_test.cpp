@@ -13,9 +13,7 @@
 #include <fcntl.h>
 #include <linux/sockios.h>
 #include <sys/ioctl.h>
-#include <sys/resource.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 
 namespace typhon {
 namespace {
@@ -406,55 +404,6 @@ TEST(LinuxIpcLimits, DescriptorsThatAPeerLeavesUnreadAreLimited)
     }
     EXPECT_TRUE(service.log.waitFor("descriptors unread"));
     EXPECT_TRUE(reads.isAlive());
-}
-
-/// Takes every free descriptor of the process, below a limit lowered for the purpose.
-class NoDescriptorsLeft {
-public:
-    NoDescriptorsLeft()
-    {
-        ::getrlimit(RLIMIT_NOFILE, &previous_);
-        rlimit lower = previous_;
-        lower.rlim_cur = std::min<rlim_t>(previous_.rlim_cur, 256);
-        ::setrlimit(RLIMIT_NOFILE, &lower);
-        for (;;) {
-            FileDescriptor one(::open("/dev/null", O_RDONLY | O_CLOEXEC));
-            if (!one) {
-                break;
-            }
-            fillers_.push_back(std::move(one));
-        }
-    }
-    ~NoDescriptorsLeft() { ::setrlimit(RLIMIT_NOFILE, &previous_); }
-
-private:
-    rlimit previous_{};
-    std::vector<FileDescriptor> fillers_;
-};
-
-TEST(LinuxIpcLimits, WithoutDescriptorsNewcomersAreTurnedAway)
-{
-    TestedService service;
-    ForeignClient before(service.path());
-    ASSERT_TRUE(before.isAlive());
-    std::vector<FileDescriptor> sockets;
-    for (int times = 0; times < 3; ++times) {
-        sockets.emplace_back(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-    }
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    service.path().copy(address.sun_path, sizeof address.sun_path - 1);
-    {
-        const NoDescriptorsLeft shortage;
-        for (const auto& socket : sockets) {
-            ASSERT_EQ(::connect(socket.get(), reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
-            EXPECT_TRUE(isClosedByPeer(socket.get()));
-        }
-        EXPECT_EQ(service.log.countContaining("are refused: Too many open files"), 1U);
-        EXPECT_TRUE(before.isAlive());
-    }
-    ForeignClient after(service.path());
-    EXPECT_TRUE(after.isAlive());
 }
 
 TEST(LinuxIpcLimits, DescriptorsInAMessageAreLimited)

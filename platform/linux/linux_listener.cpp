@@ -1,6 +1,7 @@
 #include "platform/linux/linux_listener.h"
 
 #include "platform/linux/bus_message.h"
+#include "platform/linux/descriptor_headroom.h"
 #include "platform/linux/linux_connection.h"
 
 #include <cerrno>
@@ -16,6 +17,7 @@ namespace typhon {
 namespace {
 
 constexpr auto retryDelay = std::chrono::milliseconds(100);
+constexpr auto shortageIsNewsAfter = std::chrono::minutes(1);
 
 FileDescriptor acceptFrom(int listening)
 {
@@ -196,7 +198,10 @@ LinuxListener::Accepting LinuxListener::acceptOne(int listening)
     if (!accepted) {
         return acceptFailed(listening, errno);
     }
-    shortageLogged_ = false;
+    if (isWithinDescriptorHeadroom(accepted.get())) {
+        logRefusal(EMFILE);
+        return Accepting::more;
+    }
     offer(std::move(accepted));
     return Accepting::more;
 }
@@ -209,10 +214,7 @@ LinuxListener::Accepting LinuxListener::acceptFailed(int listening, int error)
     if (error == EINTR || error == ECONNABORTED) {
         return Accepting::more;
     }
-    if (!std::exchange(shortageLogged_, true)) {
-        TYLog_Error(context_->log, "connections to " + name_ + " are refused: " + std::strerror(error) +
-                                       " (raise the limit of the service, LimitNOFILE, or end clients)");
-    }
+    logRefusal(error);
     if (error != EMFILE && error != ENFILE) {
         return Accepting::later;
     }
@@ -221,6 +223,17 @@ LinuxListener::Accepting LinuxListener::acceptFailed(int listening, int error)
     const bool refused = static_cast<bool>(acceptFrom(listening));
     reserve_ = newReserve();
     return refused && reserve_ ? Accepting::more : Accepting::later;
+}
+
+void LinuxListener::logRefusal(int error)
+{
+    const auto now = std::chrono::steady_clock::now();
+    if (refusalLogged_ && now - *refusalLogged_ < shortageIsNewsAfter) {
+        return;
+    }
+    refusalLogged_ = now;
+    TYLog_Error(context_->log, "connections to " + name_ + " are refused: " + std::strerror(error) +
+                                   " (raise the limit of the service, LimitNOFILE, or end clients)");
 }
 
 void LinuxListener::offer(FileDescriptor socket)

@@ -37,6 +37,7 @@ private:
     void handleEvents();
     Accepting acceptOne(int listening);
     Accepting acceptFailed(int listening, int error);
+    void logRefusal(int error);
     void offer(FileDescriptor socket);
     void arm();
     void armLater();
@@ -59,7 +60,7 @@ private:
     // Below: used by the one thread that handles the watch.
     /// Given up to accept, and close, a connection when there are no other descriptors left.
     FileDescriptor reserve_;
-    bool shortageLogged_ = false;
+    std::optional<std::chrono::steady_clock::time_point> refusalLogged_;
 };
 
 }  // namespace typhon

@@ -124,6 +124,7 @@ class Faults(unittest.TestCase):
         return lambda: resource.prlimit(pid, resource.RLIMIT_NOFILE, (hard, hard))
 
     def test_no_descriptors_left_refuses_newcomers_until_there_are_some(self):
+        self.system.sign(os.path.realpath(sys.executable), "org.example.foreign", ["font-enumeration"])
         self.write_registry()
         daemon = self.system.start()
         self.assertEqual(self.fonts(), {self.path})
@@ -135,8 +136,9 @@ class Faults(unittest.TestCase):
                 newcomer.connect(str(self.system.socket_path(SERVICE)))
             line = daemon.wait_for_line("are refused: Too many open files")
             self.assertIn("LimitNOFILE", line)
-            # Who was there before is served.
+            # Who was there before is served, also with what takes descriptors.
             early.call("TyphonProtocol", "updatingUserFonts")
+            self.assertEqual(set(early.checkin()["fontsInfo"]), {self.path})
         unlimited()
         self.assertEqual(self.fonts(), {self.path})
         self.assertLessEqual(len(daemon.lines_with("are refused: Too many open files")), 3)
