@@ -88,6 +88,14 @@ class Daemon:
             self._take()
             return [line for line in self.lines if text in line]
 
+    def open_files(self):
+        """What its descriptors are of."""
+        files = []
+        for link in pathlib.Path(f"/proc/{self.process.pid}/fd").iterdir():
+            with contextlib.suppress(FileNotFoundError):
+                files.append(os.readlink(link))
+        return files
+
     def kill(self, number=signal.SIGKILL):
         if self.process.poll() is None:
             self.process.send_signal(number)
@@ -242,6 +250,11 @@ class ScratchSystem:
                         HELPER_SERVICE):
             self.wait_for_socket(self.socket_path(service))
         return self.daemon
+
+    def wait_until_started(self):
+        """Waits for the last that the daemon opens in its start and keeps, where there were no preferences before."""
+        eventually(lambda: "version" in self.preferences())
+        eventually(lambda: "anon_inode:inotify" in self.daemon.open_files())
 
     def wait_for_socket(self, path):
         deadline = time.monotonic() + PATIENCE
