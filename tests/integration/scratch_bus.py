@@ -120,8 +120,8 @@ class Peer:
     def listen(self, of_anybody=False):
         """Keeps every notification of the two services, or of whoever calls itself so, as (service, arguments)."""
         for service in (PING, RELAY):
-            self.connection.signal_subscribe(None if of_anybody else service, service, "Notification", path_of(service), None,
-                                             Gio.DBusSignalFlags.NONE, self._heard)
+            self.connection.signal_subscribe(None if of_anybody else service, service, "Notification",
+                                             path_of(service), None, Gio.DBusSignalFlags.NONE, self._heard)
         # The bus is told so later, by another thread; what it answers after that, it knows.
         self.driver("GetId")
 

@@ -35,7 +35,8 @@ def with_info(name, **info):
 def swap(one, other):
     """In one step: a user without a home, if only for a moment, is gone."""
     at_working_directory, exchange = -100, 2
-    outcome = ctypes.CDLL(None).renameat2(at_working_directory, bytes(one), at_working_directory, bytes(other), exchange)
+    outcome = ctypes.CDLL(None).renameat2(at_working_directory, bytes(one), at_working_directory, bytes(other),
+                                          exchange)
     assert outcome == 0, f"cannot swap {one} and {other}"
 
 
