@@ -75,9 +75,16 @@ class RequestingSystem(unittest.TestCase):
     def given(self, application):
         """The fonts that it was given in the end, by path."""
         self.assertEqual(application.wait(), 0, application.text())
-        eventually(lambda: "}" in application.text())
-        text = application.plain_text()
-        return json.loads(text[text.index("{"):text.rindex("}") + 1])
+        eventually(lambda: self.fonts_in(application.plain_text()) is not None)
+        return self.fonts_in(application.plain_text())
+
+    @staticmethod
+    def fonts_in(text):
+        """What was written as JSON, or None while only a part of it has come."""
+        try:
+            return json.loads(text[text.index("{"):text.rindex("}") + 1])
+        except ValueError:
+            return None
 
     def registry(self):
         return plistlib.loads(self.system.real(REGISTRY).read_bytes())

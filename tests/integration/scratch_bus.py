@@ -117,14 +117,23 @@ class Peer:
         self.connection.emit_signal(destination, path_of(service), service, "Notification", arguments)
         self.driver("GetId")
 
-    def listen(self):
-        """Keeps every notification of the two services, as (service, arguments)."""
+    def listen(self, of_anybody=False):
+        """Keeps every notification of the two services, or of whoever calls itself so, as (service, arguments)."""
         for service in (PING, RELAY):
-            self.connection.signal_subscribe(service, service, "Notification", path_of(service), None,
-                                             Gio.DBusSignalFlags.NONE, self._heard)
+            self.connection.signal_subscribe(None if of_anybody else service, service, "Notification",
+                                             path_of(service), None, Gio.DBusSignalFlags.NONE, self._heard)
+        # The bus is told so later, by another thread; what it answers after that, it knows.
+        self.driver("GetId")
 
     def _heard(self, _connection, _sender, _path, interface, _member, arguments):
         self.signals.append((interface, arguments.unpack()))
+
+    def heard(self):
+        """All notifications that the bus has passed on until now."""
+        self.driver("GetId")
+        while GLib.MainContext.default().iteration(False):
+            pass
+        return self.signals
 
     def wait_for_signals(self, count):
         def arrived():

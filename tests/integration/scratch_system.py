@@ -27,6 +27,7 @@ SERVICE = "com.vorlan.typhond"
 HELPER_SERVICE = "com.vorlan.Typhon.UserFontManager"
 HELPER_PID = "/run/typhon/typhon-fontmanagerd.pid"
 PATIENCE = 60
+MOST_IN_A_PIPE = 1 << 20
 
 
 # The helper is nobody's child; so it becomes ours when it ends, to be waited for.
@@ -41,19 +42,33 @@ class Daemon:
         command = [*launcher, BIN / "typhond", "--root", system.root, "--log-level", "debug", *arguments]
         self.process = subprocess.Popen(
             [str(part) for part in command], stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
-            stderr=subprocess.PIPE, text=True, errors="replace", **(popen_options or {}))
+            stderr=subprocess.PIPE, **(popen_options or {}))
+        os.set_blocking(self.process.stderr.fileno(), False)
         self.lines = []
+        self._unfinished = b""
+        self._is_over = False
         self._changed = threading.Condition()
         self._reader = threading.Thread(target=self._read, daemon=True)
         self._reader.start()
 
     def _read(self):
-        for line in self.process.stderr:
+        while not self._is_over:
+            select.select([self.process.stderr], [], [])
             with self._changed:
-                self.lines.append(line.rstrip("\n"))
-                self._changed.notify_all()
-        with self._changed:
-            self._changed.notify_all()
+                self._take()
+
+    def _take(self):
+        """Takes over all that has been logged until now. The caller locks."""
+        if self._is_over:
+            return
+        try:
+            logged = os.read(self.process.stderr.fileno(), MOST_IN_A_PIPE)
+        except BlockingIOError:
+            return
+        self._is_over = not logged
+        *lines, self._unfinished = (self._unfinished + logged).split(b"\n")
+        self.lines += [line.decode(errors="replace") for line in lines]
+        self._changed.notify_all()
 
     def wait_for_line(self, text):
         """The first log line that contains `text`; fails when it does not come."""
@@ -67,8 +82,19 @@ class Daemon:
         return line
 
     def lines_with(self, text):
+        """All log lines until now that contain `text`."""
         with self._changed:
+            # The thread that reads may not have come to the last ones yet.
+            self._take()
             return [line for line in self.lines if text in line]
+
+    def open_files(self):
+        """What its descriptors are of."""
+        files = []
+        for link in pathlib.Path(f"/proc/{self.process.pid}/fd").iterdir():
+            with contextlib.suppress(FileNotFoundError):
+                files.append(os.readlink(link))
+        return files
 
     def kill(self, number=signal.SIGKILL):
         if self.process.poll() is None:
@@ -224,6 +250,11 @@ class ScratchSystem:
                         HELPER_SERVICE):
             self.wait_for_socket(self.socket_path(service))
         return self.daemon
+
+    def wait_until_started(self):
+        """Waits for the last that the daemon opens in its start and keeps, where there were no preferences before."""
+        eventually(lambda: "version" in self.preferences())
+        eventually(lambda: "anon_inode:inotify" in self.daemon.open_files())
 
     def wait_for_socket(self, path):
         deadline = time.monotonic() + PATIENCE

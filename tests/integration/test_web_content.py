@@ -99,7 +99,7 @@ class WebContent(unittest.TestCase):
         self.assertEqual(outcomes, [])
 
     def open_files(self):
-        return len(os.listdir(f"/proc/{self.daemon.process.pid}/fd"))
+        return len(self.daemon.open_files())
 
     def test_a_content_process_reads_with_grants_of_its_own(self):
         for sandbox in ((), self.own_sandbox()):
@@ -130,6 +130,8 @@ class WebContent(unittest.TestCase):
 
     def test_a_content_process_that_dies_leaves_its_host_unanswered_and_the_daemon_unharmed(self):
         host = self.host()
+        # What its start takes, and what of that stays, is not the content processes'.
+        self.system.wait_until_started()
         before = self.open_files()
         content = self.content("die")
         outcomes = self.start_check_in(host, content.endpoint)
@@ -141,6 +143,8 @@ class WebContent(unittest.TestCase):
 
     def test_silent_and_deaf_content_processes_keep_nobody_else_waiting(self):
         host = self.host()
+        # What its start takes, and what of that stays, is not the content processes'.
+        self.system.wait_until_started()
         before = self.open_files()
         silent, deaf, good = self.content("silent"), self.content("deaf"), self.content()
         outcomes = self.start_check_in(host, silent.endpoint)
