@@ -42,8 +42,10 @@ public:
     explicit Occupation(WorkQueue& queue)
     {
         const std::function<void()> occupy = [this] {
+            // Nothing of this object is touched once it may be destroyed.
+            const auto left = left_.get_future();
             occupied_.set_value();
-            left_.get_future().wait();
+            left.wait();
         };
         queue.async(occupy);
         occupied_.get_future().wait();
