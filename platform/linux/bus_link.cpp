@@ -70,6 +70,9 @@ void BusLink::start()
             rest(pause);
         } else {
             proceedWithHandshake(afterwards);
+            if (!ended_) {
+                arm();
+            }
         }
     });
 }
@@ -88,6 +91,8 @@ void BusLink::arm()
     }
 }
 
+/// Leaves the arming to its caller, who is done only then: two threads would read otherwise, the one on and
+/// on while the other handles what it read.
 void BusLink::proceedWithHandshake(Afterwards& afterwards)
 {
     const auto problem = continueHandshake(*handshake_, socket_.get());
@@ -95,8 +100,6 @@ void BusLink::proceedWithHandshake(Afterwards& afterwards)
         abandonLocked(problem, afterwards);
     } else if (handshake_->state() == Handshake::State::done) {
         becomeReady(afterwards);
-    } else {
-        arm();
     }
 }
 
@@ -117,7 +120,6 @@ void BusLink::becomeReady(Afterwards& afterwards)
     }
     ready_ = true;
     watch_ = context_->pool.watch(bus_.socket(), weak_from_this());
-    arm();
     std::vector<std::uint64_t> waiting;
     if (pending_) {
         for (const auto& [number, call] : pending_->byNumber) {

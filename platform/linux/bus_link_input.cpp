@@ -84,7 +84,7 @@ void BusLink::proceedAfter(std::chrono::nanoseconds taken, bool hasHungUp)
     constexpr auto none = std::chrono::nanoseconds::zero();
     const auto pause = taken > none ? context_->pace.rest(peer, taken, Clock::now()) : none;
     const std::lock_guard lock(mutex_);
-    if (ended_ || !ready_) {
+    if (ended_) {
         return;
     }
     if (!inputHeld_ && pause > none) {

@@ -87,7 +87,6 @@ TEST_F(DownloadsTest, AProgramThatDoesNotAnswerIsEnded)
     auto future = promise.get_future();
     downloads.start(request("a", 0), false,
                     [&promise](const DownloadAnswer& answer) { promise.set_value(answer.error); });
-    waitUntilBegun();
     EXPECT_EQ(errorOf(future), "the downloader does not answer within 5 s");
 }
 

@@ -179,15 +179,23 @@ TEST(EventPool, watchReportsOneEventForEachArming)
 
 TEST(EventPool, watchReportsAHangUpOnlyWhenArmed)
 {
-    EventPool pool;
+    // Its only thread handles events in their order.
+    EventPool pool(EventPool::Options{.minimumThreads = 1, .maximumThreads = 1});
     Pair pair;
+    const Pair later;
     Count events;
+    Count laterEvents;
     std::atomic<std::uint32_t> what{0};
     const auto watch = pool.watch(pair.near.get(), [&](std::uint32_t reported) {
         what = reported;
         events.add(1);
     });
     pair.far = FileDescriptor();
+    const auto laterWatch =
+        pool.watch(later.near.get(), [&laterEvents](std::uint32_t) { laterEvents.add(1); });
+    later.write("x");
+    laterWatch->arm(EPOLLIN);
+    ASSERT_TRUE(laterEvents.waitFor(1));
     EXPECT_EQ(events.value(), 0);
     watch->arm(0);
     ASSERT_TRUE(events.waitFor(1));
@@ -200,21 +208,28 @@ TEST(EventPool, handlerMayDestroyItsOwnWatchAndRearmIt)
     const Pair pair;
     Count events;
     struct State {
+        // The next handler begins before the arming returns, and the last one destroys what was armed.
+        std::mutex mutex;
         std::unique_ptr<EventPool::Watch> watch;
-        // What orders one handler before the next is the kernel, which the thread sanitizer does not see.
-        std::atomic<int> left = 100;
+        int left = 100;
     };
     const auto state = std::make_shared<State>();
     state->watch = pool.watch(pair.near.get(), [state, &events](std::uint32_t) {
-        if (--state->left > 0) {
-            state->watch->arm(EPOLLIN);
-        } else {
-            state->watch.reset();
+        {
+            const std::lock_guard lock(state->mutex);
+            if (--state->left > 0) {
+                state->watch->arm(EPOLLIN);
+            } else {
+                state->watch.reset();
+            }
         }
         events.add(1);
     });
     pair.write("x");
-    state->watch->arm(EPOLLIN);
+    {
+        const std::lock_guard lock(state->mutex);
+        state->watch->arm(EPOLLIN);
+    }
     ASSERT_TRUE(events.waitFor(100));
 }
 
@@ -270,7 +285,8 @@ TEST(EventPool, handlerObjectIsCalledAsLongAsItIsThere)
 
 TEST(EventPool, reusedDescriptorGetsNoEventsOfTheEarlierOne)
 {
-    EventPool pool;
+    // Starting another thread would open a descriptor for a moment, for its name.
+    EventPool pool(EventPool::Options{.minimumThreads = 2, .maximumThreads = 2});
     std::atomic<int> stale{0};
     Count fresh;
     for (int round = 1; round <= 200; ++round) {

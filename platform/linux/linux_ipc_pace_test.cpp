@@ -5,6 +5,8 @@
 #include "testing/ipc_service.h"
 #include "testing/wire_message.h"
 
+#include <array>
+#include <atomic>
 #include <functional>
 #include <future>
 #include <string>
@@ -42,8 +44,10 @@ public:
     explicit Occupation(WorkQueue& queue)
     {
         const std::function<void()> occupy = [this] {
+            // Nothing of this object is touched once it may be destroyed.
+            const auto left = left_.get_future();
             occupied_.set_value();
-            left_.get_future().wait();
+            left.wait();
         };
         queue.async(occupy);
         occupied_.get_future().wait();
@@ -118,15 +122,17 @@ public:
     Task<void> handle(std::shared_ptr<IncomingCall> call) override
     {
         call->reply(call->arguments());
-        if (!std::exchange(hasLingered_, true)) {
+        if (!hasLingered_.exchange(true)) {
+            lingers.set_value();
             left.get_future().wait();
         }
         co_return;
     }
+    std::promise<void> lingers;
     std::promise<void> left;
 
 private:
-    bool hasLingered_ = false;
+    std::atomic<bool> hasLingered_ = false;
 };
 
 class LingeringDelegate : public ListenerDelegate {
@@ -167,6 +173,45 @@ TEST(LinuxIpcPace, WhoWaitsForEachAnswerNeverRestsHoweverFastItGoesOn)
     delegate->object->left.set_value();
     ASSERT_TRUE(hasAnswer(client));
     EXPECT_TRUE(client.isAlive());
+}
+
+/// A connection over which so many calls come in one piece with the end of the handshake, whose beginning was
+/// answered before.
+FileDescriptor callsBehindHandshake(const TestedService& service, int calls)
+{
+    const auto handshake = pipelinedHandshake();
+    const auto begin = handshake.find("DATA");
+    const std::string text = "hasty";
+    std::string burst = handshake.substr(begin);
+    for (int count = 0; count < calls; ++count) {
+        burst += WireMessage::call(1, testedInterface, "echo", &text);
+    }
+    auto socket = rawConnection(service.path());
+    write(socket, handshake.substr(0, begin));
+    std::array<char, 64> answer;
+    EXPECT_GT(::recv(socket.get(), answer.data(), answer.size(), 0), 0);
+    write(socket, burst);
+    return socket;
+}
+
+TEST(LinuxIpcPace, WhatFollowsTheHandshakeIsReadOnlyAsItIsHandled)
+{
+    for (int times = 0; times < 20; ++times) {
+        TestedService service;
+        const auto delegate = std::make_shared<LingeringDelegate>();
+        service.listener->setDelegate(delegate);
+        const auto socket = callsBehindHandshake(service, 100);
+        delegate->object->lingers.get_future().wait();
+        // Time for another thread to read on, up to the limit of what may be unanswered.
+        ForeignClient other(service.path());
+        for (int count = 0; count < 20; ++count) {
+            EXPECT_TRUE(other.isAlive());
+        }
+        delegate->object->left.set_value();
+        ::shutdown(socket.get(), SHUT_WR);
+        EXPECT_TRUE(isClosedByPeer(socket.get()));
+        ASSERT_EQ(service.log.countContaining("too many unanswered calls"), 0U);
+    }
 }
 
 TEST(LinuxIpcPace, WhoDoesNotWaitForItsAnswersRests)

@@ -5,6 +5,7 @@
 #include "platform/linux/scratch_directory.h"
 
 #include <atomic>
+#include <chrono>
 #include <csignal>
 #include <filesystem>
 #include <string>
@@ -218,6 +219,17 @@ TEST_F(LinuxPreferencesTest, RefusesToWriteMoreThanItWouldRead)
     EXPECT_FALSE(std::filesystem::exists(scratch.real(store)));
 }
 
+/// Tries anew where others held the lock for longer than one attempt waits for it; false after a minute.
+bool synchronizeInTheEnd(LinuxPreferences& preferences)
+{
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::minutes(1);
+    bool isWritten = preferences.synchronize();
+    while (!isWritten && std::chrono::steady_clock::now() < deadline) {
+        isWritten = preferences.synchronize();
+    }
+    return isWritten;
+}
+
 /// Makes `count` synchronised changes in a process of its own; its exit status tells whether all succeeded.
 pid_t startWriter(const RootDirectory& root, int writer, int count)
 {
@@ -228,7 +240,7 @@ pid_t startWriter(const RootDirectory& root, int writer, int count)
         bool good = true;
         for (int n = 0; n < count; ++n) {
             preferences.setValue(std::to_string(writer) + "-" + std::to_string(n), PropertyList(n));
-            good = preferences.synchronize() && good;
+            good = synchronizeInTheEnd(preferences) && good;
         }
         ::_exit(good ? 0 : 1);
     }

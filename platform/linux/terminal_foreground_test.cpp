@@ -158,7 +158,9 @@ TEST_F(ForegroundTest, ATerminalThatASandboxMadeItselfIsNone)
         ChildProcess::exec(sandboxOf({"python3", "-c", R"(import os, pty, sys
 child, terminal = pty.fork()
 if child == 0:
-    os.execvp("sleep", ["sleep", "1000"])
+    os.execvp("sh", ["sh", "-c", "echo; read line"])
+# It has its terminal, and is what it will be.
+os.read(terminal, 1)
 sys.stdin.read(1)
 sys.stdout.write("x")
 sys.stdout.flush()

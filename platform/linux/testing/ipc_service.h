@@ -250,10 +250,16 @@ inline FileDescriptor rawConnection(const std::string& path)
     return std::move(connected.socket);
 }
 
+/// False when the peer closes the socket before all of it is sent.
+inline bool wasSent(const FileDescriptor& socket, std::string_view bytes)
+{
+    return ::send(socket.get(), bytes.data(), bytes.size(), MSG_NOSIGNAL) ==
+           static_cast<ssize_t>(bytes.size());
+}
+
 inline void write(const FileDescriptor& socket, std::string_view bytes)
 {
-    ASSERT_EQ(::send(socket.get(), bytes.data(), bytes.size(), MSG_NOSIGNAL),
-              static_cast<ssize_t>(bytes.size()));
+    ASSERT_TRUE(wasSent(socket, bytes));
 }
 
 /// True when the peer closes the socket (what it sends before is read and dropped).
