@@ -57,6 +57,12 @@ Task<void> DaemonReports::report(RegistryChange change, Kind kind)
         Task<void> sending = send(wire::fontChanged.member, std::move(arguments));
         co_await std::move(sending);
     }
+    if (!change.gone.empty() || !change.available.empty() || change.isRegistryChanged) {
+        // A report is answered before anything is done about it, and what comes next is taken afterwards: so
+        // whoever made the change sees it as soon as the change is answered.
+        Task<void> settling = send(wire::updatingUserFonts.member, {});
+        co_await std::move(settling);
+    }
 }
 
 Task<void> DaemonReports::send(std::string member, Arguments arguments)
