@@ -289,12 +289,13 @@ class ScratchSystem:
         pid = self.helper_pid()
         if pid is not None:
             pidfd = os.pidfd_open(pid)
+            # While this one lives, that is nobody else's file: the next one may write its own at once.
+            self.real(HELPER_PID).unlink(missing_ok=True)
             signal.pidfd_send_signal(pidfd, signal.SIGKILL)
             select.select([pidfd], [], [], PATIENCE)
             os.close(pidfd)
             with contextlib.suppress(ChildProcessError):
                 os.waitpid(pid, 0)
-            self.real(HELPER_PID).unlink(missing_ok=True)
 
     def start_bus(self, window=0.5):
         """Runs a system bus with the notification relay on it until `close`; gives the bus (see scratch_bus)."""
