@@ -269,6 +269,16 @@ class ScratchSystem:
                     time.sleep(0.01)
         raise AssertionError(f"no socket {path}: {self.daemon.lines}")
 
+    def await_asset_watch(self):
+        """The store is watched some time after the first synchronisation: touches it until that is noticed."""
+        touched = self.real(ASSET_STORE) / "touched"
+
+        def is_noticed():
+            touched.touch()
+            touched.unlink()
+            return self.daemon.lines_with("FontAssetsEventStreamCallback - ")
+        eventually(is_noticed)
+
     def stop(self):
         if self.daemon is not None:
             self.daemon.kill()
