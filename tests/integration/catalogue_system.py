@@ -56,10 +56,10 @@ class CatalogueSystem(ScratchSystem):
     # -- the system
 
     def configure(self, url=None, kind=LETTERFORM, **more):
-        """Says where the catalogue comes from; short of patience, for a test."""
+        """Says where the catalogue comes from."""
         path = self.real(f"{SOURCES}/{kind}.plist")
         path.parent.mkdir(parents=True, exist_ok=True)
-        entry = {"URL": url or self.server.url(), "StallSeconds": 2, "TotalSeconds": 30, **more}
+        entry = {"URL": url or self.server.url(), "StallSeconds": 30, "TotalSeconds": 50, **more}
         path.write_bytes(plistlib.dumps(entry))
 
     def let_update_often(self):

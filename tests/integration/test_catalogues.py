@@ -43,13 +43,15 @@ class Catalogues(unittest.TestCase):
         self.assertEqual(said.count("\n"), 1, said)
         self.assert_usable()
 
-    def assert_each_refused(self, answers):
+    def assert_each_refused(self, answers, **source):
         self.start_with_one()
+        self.system.configure(kind=FONTS, **source)
         for name, (answer, reason) in answers.items():
             with self.subTest(name):
                 self.server.answer = answer
                 self.assert_refused(reason)
         # And the next good one is taken.
+        self.system.configure(kind=FONTS)
         self.system.serve(6, kind=FONTS)
         self.system.fetch(FONTS)
         self.assert_usable(6)
@@ -62,7 +64,7 @@ class HostileServers(Catalogues):
         self.assert_each_refused({
             "at once": (serving.stalling(), reason),
             "in the head": (serving.stalling(b"HTTP/1.1 200 OK\r\nContent-"), reason),
-            "in the middle": (serving.stalling(serving.head(len(catalogue)) + catalogue[:200]), reason)})
+            "in the middle": (serving.stalling(serving.head(len(catalogue)) + catalogue[:200]), reason)}, StallSeconds=2)
 
     def test_a_server_that_drips_is_given_up(self):
         self.start_with_one()
