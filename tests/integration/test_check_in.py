@@ -1,8 +1,11 @@
 """Each kind of client checks in with a real daemon and gets its own view."""
 
 import base64
+import os
+import sys
 import unittest
 
+import foreign_client
 from scratch_system import ASSET_STORE, FONT_ASSETS, FONT_FILES, ScratchSystem, entry
 
 
@@ -77,7 +80,14 @@ class CheckIn(unittest.TestCase):
         self.daemon.wait_for_line("connected: org.example.plain")
 
     def test_the_font_registry_helper_is_no_client(self):
-        self.assertIsNone(self.checkin("com.vorlan.Typhon.UserFontManager", ["font-enumeration"]))
+        identifier = "com.vorlan.Typhon.UserFontManager"
+        self.assertIsNone(self.checkin(identifier, ["font-enumeration"]))
+        self.system.sign(os.path.realpath(sys.executable), identifier, ["font-enumeration"])
+        client = foreign_client.Client(str(self.system.root))
+        self.addCleanup(client.close)
+        self.assertIsNone(client.checkin())
+        # Answered when all that belongs to the message before has been done.
+        client.call("TyphonProtocol", "updatingUserFonts")
         self.assertEqual(self.daemon.lines_with("connected: com.vorlan.Typhon.UserFontManager"), [])
 
     def test_a_program_changed_after_signing_is_nobody(self):

@@ -126,10 +126,11 @@ class Escapes(DeletionTest):
         os.symlink(target, self.system.real(f"{FONT_FILES}/org.example.foundry/{name}"))
 
     def assert_refused(self, *paths):
-        """Schedules them together with a file that may go; when that is gone, they have been tried."""
+        """Schedules them together with a file that may go, in one pass that tries them all."""
         self.schedule(*paths, self.own)
-        eventually(lambda: not self.exists(self.own))
-        eventually(lambda: len(self.system.daemon.lines_with(FAILED)) == len(paths))
+        self.system.daemon.wait_for_line(ALL_DONE)
+        self.assertFalse(self.exists(self.own))
+        self.assertEqual(len(self.system.daemon.lines_with(FAILED)), len(paths))
 
     def test_dots(self):
         foundry = f"{FONT_FILES}/org.example.foundry"
@@ -176,7 +177,8 @@ class Escapes(DeletionTest):
     def test_paths_outside_the_trees_are_not_even_scheduled(self):
         self.schedule("/var/mobile/Library/sentinel", "/var/mobile/Library/folder", "/", "",
                       "/var/mobile/Library/UserFonts/FontFilesX/a", FONT_FILES, self.own)
-        eventually(lambda: not self.exists(self.own))
+        self.system.daemon.wait_for_line(ALL_DONE)
+        self.assertFalse(self.exists(self.own))
         self.assertEqual(self.system.daemon.lines_with(FAILED), [])
 
 
