@@ -18,6 +18,7 @@ class Requests(RequestingSystem):
     # -- the whole request
 
     def test_a_document_gets_a_font_that_the_user_switches_on_and_keeps_it(self):
+        counts = {"org.example.writer": {"requests": 1, "misses": 1, "suggestions": 1, "resolved": 1}}
         agent = self.start_agent()
         application = self.ask(*ASKED)
         agent.wait_for("Enter: done")
@@ -39,8 +40,11 @@ class Requests(RequestingSystem):
         fonts = self.given(application)
         self.assertEqual(set(fonts), {SANS_PATH, OTHER_SERIF_PATH})
         self.assertTrue(all("data" in font for font in fonts.values()))
-        eventually(lambda: not self.registry()[OTHER_SERIF_PATH]["disabled"])
+        # Switched on and recorded once the application has its answer.
+        eventually(lambda: OTHER_SERIF_PATH in self.system.checkin(self.writer, sandboxed=True)["fontsInfo"])
+        self.assertFalse(self.registry()[OTHER_SERIF_PATH]["disabled"])
         self.assertTrue(self.registry()[SERIF_PATH]["disabled"])
+        eventually(lambda: self.counts() == counts)
 
         for _ in range(2):
             read = subprocess.run([str(word) for word in self.sandboxed("open", OTHER_SERIF_PATH)],
@@ -48,11 +52,12 @@ class Requests(RequestingSystem):
             self.assertEqual(read.stdout, SERIF.read_bytes(), read.stderr)
             self.system.restart()
 
-        counts = json.loads(self.system.ctl("--json", "analytics").stdout)
-        self.assertEqual(counts, {"org.example.writer": {"requests": 1, "misses": 1, "suggestions": 1,
-                                                         "resolved": 1}})
+        self.assertEqual(self.counts(), counts)
         preferences = self.system.preferences()
         self.assertEqual((preferences["missed"], preferences["resolved"]), (1, 1))
+
+    def counts(self):
+        return json.loads(self.system.ctl("--json", "analytics").stdout)
 
     def test_the_same_process_reads_what_it_was_given_through_its_tokens(self):
         sample = self.system.folder / "sample"
@@ -99,6 +104,8 @@ class Requests(RequestingSystem):
                 self.assertEqual(agent.wait(), status)
                 self.assertTrue(agent.is_as_before())
                 eventually(lambda: "\x1b[?1049l" in agent.text())
+                # The next one is refused until the daemon knows that this one is gone.
+                self.system.daemon.wait_for_line(f"the session agent, process {agent.process.pid}, is gone")
                 if number == signal.SIGTERM:
                     # It has declined; a crash leaves the dialog to the next agent.
                     self.assertEqual(self.given(application), {})
