@@ -60,6 +60,7 @@ class FontPicker(unittest.TestCase):
         with theirs:
             application = subprocess.Popen([str(word) for word in command], stdin=theirs, stdout=subprocess.PIPE,
                                            text=True, env={**os.environ, "TYPHON_ROOT": str(self.system.root)})
+        self.addCleanup(application.kill)
         with ours:
             endpoint = socket.recv_fds(ours, 1, 1)[1][0]
         self.addCleanup(os.close, endpoint)

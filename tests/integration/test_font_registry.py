@@ -7,6 +7,7 @@ import plistlib
 import select
 import shutil
 import signal
+import subprocess
 import unittest
 
 from scratch_system import BIN, FONT_FILES, HELPER_SERVICE, PATIENCE, REGISTRY, ScratchSystem, eventually
@@ -15,6 +16,7 @@ DEJAVU = pathlib.Path("/usr/share/fonts/truetype/dejavu")
 SANS = DEJAVU / "DejaVuSans.ttf"
 BOLD = DEJAVU / "DejaVuSans-Bold.ttf"
 PROVIDER = "system-installation"
+PROVIDERS = ("foundry", "other", "a", *range(6))
 
 
 def registry_of(system):
@@ -22,10 +24,18 @@ def registry_of(system):
     return plistlib.loads(path.read_bytes()) if path.exists() else {}
 
 
+def state_of(pid):
+    """The letter that the kernel gives a process's state."""
+    return pathlib.Path(f"/proc/{pid}/stat").read_text().rpartition(")")[2].split()[0]
+
+
 class FontRegistry(unittest.TestCase):
     def setUp(self):
         self.system = ScratchSystem()
         self.addCleanup(self.system.close)
+        for provider in PROVIDERS:
+            # Else the daemon would take them for removed applications, if it comes to look for those late.
+            self.system.install_application(f"org.example.{provider}")
         self.system.start()
 
     def sandboxed(self, program, *words, check=True):
@@ -117,21 +127,26 @@ class FontRegistry(unittest.TestCase):
         # The daemon has calls of its own for the helper, and must not be taken for the one below.
         eventually(lambda: self.stops_the_daemon_between_calls_of(pid))
         os.kill(pid, signal.SIGSTOP)
-        with concurrent.futures.ThreadPoolExecutor(1) as pool:
-            call = pool.submit(self.system.ctl, "fonts", "install", "--identifier", "org.example.a", SANS,
-                               check=False)
-            # It connects to the stopped helper's socket and waits; killed earlier it would start another one.
-            eventually(lambda: self.is_waiting_for(pid) or call.done())
-            self.system.kill_helper()
-            self.system.daemon.process.send_signal(signal.SIGCONT)
-            done = call.result()
-        self.assertEqual(done.returncode, 1)
-        self.assertIn("ended during the call", done.stderr.decode())
+        call = subprocess.Popen(
+            [str(BIN / "typhonctl"), "--root", str(self.system.root), "fonts", "install", "--identifier", "org.example.a",
+             str(SANS)], stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL, stderr=subprocess.PIPE)
+        self.addCleanup(call.kill)
+        # It connects to the stopped helper's socket and waits; killed earlier it would start another one.
+        eventually(lambda: self.is_waiting_for(pid) or call.poll() is not None)
+        # Connected it has yet to call.
+        eventually(lambda: state_of(call.pid) in "SZ")
+        self.system.kill_helper()
+        self.system.daemon.process.send_signal(signal.SIGCONT)
+        _, said = call.communicate(timeout=PATIENCE)
+        self.assertEqual(call.returncode, 1)
+        self.assertIn("ended during the call", said.decode())
         self.assertEqual(registry_of(self.system), {})
 
     def stops_the_daemon_between_calls_of(self, helper):
         daemon = self.system.daemon.process
         daemon.send_signal(signal.SIGSTOP)
+        # A thread that is in the kernel stops on its way out of it.
+        os.waitid(os.P_PID, daemon.pid, os.WSTOPPED)
         is_between = not self.is_waiting_for(helper)
         if not is_between:
             daemon.send_signal(signal.SIGCONT)
