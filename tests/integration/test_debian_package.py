@@ -22,7 +22,7 @@ class DebianPackage(ApplicationsThatGo):
         self.dpkg = PackageDatabase(self.system)
         self.package = SamplePackage(self.system, IDENTIFIER, ["system-installation", "app-usage"])
         # What comes back within it was upgraded, what does not was removed.
-        self.start_with_relay(window=4)
+        self.start_with_relay(window=10)
         self.system.install_application("org.example.foundry")
         self.system.ctl("fonts", "install", "--identifier", "org.example.foundry", SERIF)
 
@@ -91,6 +91,7 @@ class DebianPackage(ApplicationsThatGo):
         self.assertEqual(self.version(), "2.0")
         self.assert_works()
         self.remove()
+        self.relay.wait_for_line("was removed")
         self.assertEqual(sum("was removed" in line for line in self.relay.lines), 1)
 
 
