@@ -53,6 +53,9 @@ class Kills(unittest.TestCase):
     def setUp(self):
         self.system = ScratchSystem()
         self.addCleanup(self.system.close)
+        # Brings up the helper, for all rounds: one that starts sweeps the folders that are being made for the next.
+        self.system.start()
+        self.system.daemon.kill()
         self.random = random.Random(SEED)
         self.counts = {"still scheduled": 0, "deleted": 0, "there and not scheduled": 0, "recorded": 0}
 
@@ -92,7 +95,6 @@ class Kills(unittest.TestCase):
             time.sleep(self.random.random() * LATEST_KILL)
         self.system.daemon.kill()
         recorder.join()
-        self.system.stop()
         return recorder
 
     def judge(self, scheduled, due, flushed, waiting):
@@ -115,7 +117,7 @@ class Kills(unittest.TestCase):
         if before:
             waits = set(before) - still_due
             daemon.wait_for_line("next deletion after " if waits else "all files deleted.")
-        self.system.stop()
+        daemon.kill()
         for path in still_due:
             self.assertFalse(self.exists(path), path)
 
